@@ -1,0 +1,91 @@
+#include "ksp/exporter.h"
+#include "platform/driver_service.h"
+
+// Selector numbers of the controller's commands.
+const SelectorPair statsSelector = {13, 13};
+const SelectorPair readStatsSelector = {10, 10};
+const SelectorPair mspStatsSelector = {221, 221};
+const SelectorPair bandStatsSelector = {11, 11};
+const SelectorPair defectsListSelector = {15, 15};
+const SelectorPair telemetryListSelectors = {17, 17};
+const SelectorPair taskSchedulerSelectors = {39, 39};
+const SelectorPair snapshotSelectors = {22, 22};
+const SelectorPair snapshotHeaderSelectors = {145, 145};
+
+const SelectorPair* getStatsSelector() {
+  return &statsSelector;
+}
+const SelectorPair* getReadStatsSelector() {
+  return &readStatsSelector;
+}
+const SelectorPair* getMspStatsSelector() {
+  return &mspStatsSelector;
+}
+const SelectorPair* getDefectsListSelector() {
+  return &defectsListSelector;
+}
+const SelectorPair* getTelemetryListSelectors() {
+  return &telemetryListSelectors;
+}
+const SelectorPair* getTaskSchedulerSelectors() {
+  return &taskSchedulerSelectors;
+}
+const SelectorPair* getSnapshotSelectors() {
+  return &snapshotSelectors;
+}
+const SelectorPair* getSnapshotHeaderSelectors() {
+  return &snapshotHeaderSelectors;
+}
+const SelectorPair* getBandStatsSelector() {
+  return &bandStatsSelector;
+}
+
+namespace {
+
+struct Methods {
+  uint32_t extra;
+  uint32_t tunnel;
+  uint32_t secondary;
+};
+
+// The controllers differ in name, driver methods and whether they export media statistics, in nothing else.
+constexpr ExporterEntry controllerRow(const char* className, const char* propertyKey, Methods methods,
+                                      SelectorAccessor mspStats) {
+  return {
+      .className = className,
+      .propertyKey = propertyKey,
+      .connection = 0,
+      .service = 0,
+      .extraMethod = methods.extra,
+      .tunnelMethod = methods.tunnel,
+      .secondaryMethod = methods.secondary,
+      .getStatsSelector = getStatsSelector,
+      .getReadStatsSelector = getReadStatsSelector,
+      .getMspStatsSelector = mspStats,
+      .getDefectsListSelector = getDefectsListSelector,
+      .getTelemetryListSelectors = getTelemetryListSelectors,
+      .getTaskSchedulerSelectors = getTaskSchedulerSelectors,
+      .getSnapshotSelectors = getSnapshotSelectors,
+      .getSnapshotHeaderSelectors = getSnapshotHeaderSelectors,
+      .getBandStatsSelector = getBandStatsSelector,
+      .parseBuffer = nullptr,
+      .releaseContext = nullptr,
+      .parseMspBuffer = nullptr,
+      .parseFtlBuffer = nullptr,
+      .parseStatKeyBuffer = nullptr,
+      .releaseGenericContext = nullptr,
+  };
+}
+
+constexpr Methods kNvmeMethods = {.extra = 0xFFFFFFFF, .tunnel = 9, .secondary = 9};
+constexpr Methods kStorageMethods = {.extra = 5, .tunnel = 8, .secondary = 8};
+constexpr char kCharacteristics[] = "Controller Characteristics";
+
+}  // namespace
+
+constinit ExporterEntry nand_exporters_tunnel[KSPExporterRows] = {
+    controllerRow("VantorFlash3NVMeController", kCharacteristics, kNvmeMethods, getMspStatsSelector),
+    controllerRow("VantorEmbeddedNVMeController", kCharacteristics, kNvmeMethods, nullptr),
+    controllerRow("KSPStorage", PropertyMatchKey, kStorageMethods, nullptr),
+    {},
+};

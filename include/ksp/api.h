@@ -1,0 +1,16 @@
+#ifndef KSP_API_H
+#define KSP_API_H
+
+/* What every public header of libksp needs: export and C linkage. */
+
+#define KSP_API __attribute__((visibility("default")))
+
+#ifdef __cplusplus
+#define KSP_BEGIN_DECLARATIONS extern "C" {
+#define KSP_END_DECLARATIONS }
+#else
+#define KSP_BEGIN_DECLARATIONS
+#define KSP_END_DECLARATIONS
+#endif
+
+#endif
