@@ -1,0 +1,4 @@
+#pragma once
+
+/// Attaches the activity handler to the daemon's background activity.
+void registerActivityHandler();

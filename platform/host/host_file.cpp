@@ -1,0 +1,259 @@
+#include "platform/host/host_file.h"
+
+#include <sys/stat.h>
+
+#include <toml++/toml.h>
+#include <algorithm>
+#include <cerrno>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <limits>
+#include <memory>
+
+#include "default_host.h"
+
+namespace host {
+
+namespace {
+
+constexpr char kSystemFile[] = "/etc/brellium/host.toml";
+constexpr size_t kGreatestFileSize = size_t{1} << 20;
+constexpr uint32_t kGreatestSeconds = 366 * 24 * 60 * 60;
+
+/// The controllers that the host can emulate, and the driver method through which each takes its commands.
+struct EmulatedClass {
+  std::string_view className;
+  uint32_t tunnelMethod;
+};
+constexpr EmulatedClass kEmulatedClasses[] = {
+    {"VantorFlash3NVMeController", 9},
+    {"VantorEmbeddedNVMeController", 9},
+    {"KSPStorage", 8},
+};
+
+/// Reads the keys of one table, each at most once, and then refuses those that nobody asked for.
+class TableReader {
+ public:
+  TableReader(std::string_view file, std::string_view title, const toml::table& table)
+      : file_(file), title_(title), table_(table) {}
+
+  [[noreturn]] void fail(const toml::source_region& where, const std::string& fault) const {
+    throw HostFileError(file_, where.begin.line, fault);
+  }
+
+  [[noreturn]] void fail(const std::string& fault) const { fail(table_.source(), fault); }
+
+  const toml::node* find(std::string_view key) {
+    known_.push_back(key);
+    return table_.get(key);
+  }
+
+  /// The value of `key` as T, which `kind` names in messages; none when it is absent.
+  template <class T>
+  std::optional<T> value(std::string_view key, std::string_view kind) {
+    const toml::node* node = find(key);
+    if (node == nullptr) return std::nullopt;
+    if (!node->is<T>()) failType(*node, key, kind);
+    return node->value_exact<T>();
+  }
+
+  std::optional<uint32_t> number(std::string_view key, uint32_t least, uint32_t greatest) {
+    const toml::node* node = find(key);
+    if (node == nullptr) return std::nullopt;
+    return number(*node, key, least, greatest);
+  }
+
+  uint32_t number(const toml::node& node, std::string_view key, uint32_t least, uint32_t greatest) const {
+    if (!node.is_integer()) failType(node, key, "a whole number");
+    const int64_t value = *node.value_exact<int64_t>();
+    if (value < least || value > greatest) {
+      fail(node.source(), quoted(key) + " is " + std::to_string(value) + ", but must be from " +
+                              std::to_string(least) + " to " + std::to_string(greatest));
+    }
+    return static_cast<uint32_t>(value);
+  }
+
+  /// A driver's 32-bit result code, 0 when it is absent.
+  int32_t result(std::string_view key) {
+    return static_cast<int32_t>(number(key, 0, std::numeric_limits<uint32_t>::max()).value_or(0));
+  }
+
+  [[noreturn]] void failType(const toml::node& node, std::string_view key, std::string_view kind) const {
+    fail(node.source(), quoted(key) + " must be " + std::string(kind));
+  }
+
+  void refuseUnknownKeys() const {
+    for (const auto& [key, node] : table_) {
+      if (std::find(known_.begin(), known_.end(), key.str()) == known_.end()) {
+        fail(key.source(), "unknown key " + quoted(key.str()));
+      }
+    }
+  }
+
+ private:
+  std::string quoted(std::string_view key) const {
+    std::string text = "'";
+    if (!title_.empty()) text.append(title_).append(".");
+    return text.append(key).append("'");
+  }
+
+  std::string_view file_;
+  std::string_view title_;
+  const toml::table& table_;
+  std::vector<std::string_view> known_;
+};
+
+ActivitySettings readActivity(TableReader reader) {
+  ActivitySettings settings;
+  if (const toml::node* node = reader.find("identifier")) {
+    if (!node->is_string()) reader.failType(*node, "identifier", "a text");
+    settings.identifier = *node->value_exact<std::string>();
+    settings.identifierLine = node->source().begin.line;
+  } else {
+    reader.fail("the activity has no 'identifier'");
+  }
+  settings.startAfterSeconds = reader.number("start_after_s", 0, kGreatestSeconds).value_or(0);
+  settings.retrySeconds = reader.number("retry_s", 0, kGreatestSeconds).value_or(settings.retrySeconds);
+  settings.intervalSeconds = reader.number("interval_s", 0, kGreatestSeconds).value_or(0);
+  reader.refuseUnknownKeys();
+  return settings;
+}
+
+YieldSettings readYield(TableReader reader) {
+  YieldSettings settings;
+  settings.onBattery = reader.value<bool>("on_battery", "true or false").value_or(false);
+  settings.ioPressurePercent = reader.number("io_pressure_percent", 0, 100);
+  settings.afterSeconds = reader.number("after_s", 0, kGreatestSeconds);
+  settings.atCheck = reader.number("at_check", 1, std::numeric_limits<uint32_t>::max());
+  reader.refuseUnknownKeys();
+  return settings;
+}
+
+/// A step is its reply, or a table of reply and result.
+Step readStep(const TableReader& controller, std::string_view file, const toml::node& node) {
+  constexpr uint32_t kGreatest = std::numeric_limits<uint32_t>::max();
+  if (const toml::table* table = node.as_table()) {
+    TableReader reader(file, "controller.steps", *table);
+    const Step step = {.reply = reader.number("reply", 0, kGreatest).value_or(0),
+                       .result = reader.result("result")};
+    reader.refuseUnknownKeys();
+    return step;
+  }
+  return {.reply = controller.number(node, "steps", 0, kGreatest), .result = 0};
+}
+
+std::string knownClasses() {
+  std::string names;
+  for (const EmulatedClass& known : kEmulatedClasses) {
+    names.append(names.empty() ? "" : ", ").append(known.className);
+  }
+  return names;
+}
+
+ControllerSettings readController(std::string_view file, TableReader reader) {
+  ControllerSettings settings;
+  const toml::node* node = reader.find("class");
+  if (node == nullptr) reader.fail("the controller has no 'class'");
+  if (!node->is_string()) reader.failType(*node, "class", "a text");
+  settings.className = *node->value_exact<std::string>();
+  const auto* known = std::find_if(std::begin(kEmulatedClasses), std::end(kEmulatedClasses),
+                                   [&](const auto& each) { return each.className == settings.className; });
+  if (known == std::end(kEmulatedClasses)) {
+    reader.fail(node->source(), "unknown class '" + settings.className + "'; there are " + knownClasses());
+  }
+  settings.tunnelMethod = known->tunnelMethod;
+  if (const toml::node* steps = reader.find("steps")) {
+    if (!steps->is_array()) reader.failType(*steps, "steps", "a list");
+    for (const toml::node& step : *steps->as_array()) {
+      settings.steps.push_back(readStep(reader, file, step));
+    }
+  }
+  settings.openResult = reader.result("open_result");
+  settings.closeResult = reader.result("close_result");
+  settings.goneAfterLookups = reader.number("gone_after_lookups", 0, std::numeric_limits<uint32_t>::max());
+  reader.refuseUnknownKeys();
+  return settings;
+}
+
+HostFile readHostFile(std::string_view name, const toml::table& root) {
+  HostFile file;
+  file.name = name;
+  TableReader reader(name, "", root);
+  if (const toml::node* node = reader.find("activity")) {
+    if (!node->is_table()) reader.failType(*node, "activity", "a table");
+    file.activity = readActivity({name, "activity", *node->as_table()});
+  } else {
+    reader.fail("there is no activity: a table [activity] must declare it");
+  }
+  if (const toml::node* node = reader.find("yield")) {
+    if (!node->is_table()) reader.failType(*node, "yield", "a table");
+    file.yield = readYield({name, "yield", *node->as_table()});
+  }
+  if (const toml::node* node = reader.find("controller")) {
+    if (!node->is_array()) reader.failType(*node, "controller", "a list of tables: [[controller]]");
+    for (const toml::node& controller : *node->as_array()) {
+      if (!controller.is_table())
+        reader.failType(controller, "controller", "a list of tables: [[controller]]");
+      file.controllers.push_back(readController(name, {name, "controller", *controller.as_table()}));
+    }
+  }
+  reader.refuseUnknownKeys();
+  return file;
+}
+
+std::string faultLine(std::string_view file, unsigned line, std::string_view fault) {
+  std::string text(file);
+  if (line != 0) text.append(":").append(std::to_string(line));
+  text.append(": ").append(fault);
+  // Names and keys come from outside; a terminal must not be steered by them.
+  std::replace_if(
+      text.begin(), text.end(), [](unsigned char c) { return c < ' ' || c == 0x7F; }, '?');
+  return text;
+}
+
+std::string readWhole(const std::string& path) {
+  const auto fail = [&](const char* reason) {
+    throw HostFileError(path, 0, std::string("cannot be read: ") + reason);
+  };
+  const std::unique_ptr<std::FILE, int (*)(std::FILE*)> file(std::fopen(path.c_str(), "re"), std::fclose);
+  if (!file) fail(std::strerror(errno));
+  std::string text(kGreatestFileSize + 1, '\0');
+  text.resize(std::fread(text.data(), 1, text.size(), file.get()));
+  if (std::ferror(file.get()) != 0) fail(std::strerror(errno));
+  if (text.size() > kGreatestFileSize) fail("it is larger than 1 MiB");
+  return text;
+}
+
+}  // namespace
+
+HostFileError::HostFileError(std::string_view file, unsigned line, std::string_view fault)
+    : std::runtime_error(faultLine(file, line, fault)) {}
+
+HostFile parseHostFile(std::string_view text, std::string_view name) {
+  try {
+    return readHostFile(name, toml::parse(text, name));
+  } catch (const toml::parse_error& error) {
+    throw HostFileError(name, error.source().begin.line, error.description());
+  }
+}
+
+HostFile loadHostFile(const std::string& path) {
+  return parseHostFile(readWhole(path), path);
+}
+
+const HostFile& hostFile() {
+  static const HostFile file = [] {
+    if (const char* named = secure_getenv("KSP_HOST_FILE")) return loadHostFile(named);
+    struct stat ignored = {};
+    if (stat(kSystemFile, &ignored) == 0 || errno != ENOENT) return loadHostFile(kSystemFile);
+    return parseHostFile(kDefaultHost, "built-in host file");
+  }();
+  return file;
+}
+
+void report(const HostFileError& fault) {
+  std::fprintf(stderr, "%s: %s\n", program_invocation_short_name, fault.what());
+}
+
+}  // namespace host

@@ -1,0 +1,79 @@
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <stdexcept>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace host {
+
+/// When the activity runs.
+struct ActivitySettings {
+  std::string identifier;
+  unsigned identifierLine = 0;
+  uint32_t startAfterSeconds = 0;
+  /// Between a deferred run and the next one.
+  uint32_t retrySeconds = 60;
+  /// Between a finished run and the next one; 0 means that there is none and the process is ended.
+  uint32_t intervalSeconds = 0;
+};
+
+/// When the activity must yield; what is not set never asks it to.
+struct YieldSettings {
+  bool onBattery = false;
+  std::optional<uint32_t> ioPressurePercent;
+  std::optional<uint32_t> afterSeconds;
+  /// Number of the run's question, from 1, from which on the answer is yes.
+  std::optional<uint32_t> atCheck;
+};
+
+/// What a step of an emulated controller answers.
+struct Step {
+  uint32_t reply = 0;
+  int32_t result = 0;
+};
+
+struct ControllerSettings {
+  std::string className;
+  uint32_t tunnelMethod = 0;
+  /// In turn, from the start again behind the last; without any the controller never has work.
+  std::vector<Step> steps;
+  int32_t openResult = 0;
+  int32_t closeResult = 0;
+  /// The driver is gone once it was looked up this often.
+  std::optional<uint32_t> goneAfterLookups;
+};
+
+struct HostFile {
+  /// Name of the file, for messages.
+  std::string name;
+  ActivitySettings activity;
+  YieldSettings yield;
+  std::vector<ControllerSettings> controllers;
+};
+
+/// A fault of a host file. `what()` is one line, "file:line: fault", or "file: fault" where there is no line.
+class HostFileError : public std::runtime_error {
+ public:
+  HostFileError(std::string_view file, unsigned line, std::string_view fault);
+};
+
+/// Exit status of a start that a wrong host file ended.
+inline constexpr int kExitConfiguration = 78;
+
+/// Reads and checks the host file text; `name` stands in messages. Throws HostFileError.
+HostFile parseHostFile(std::string_view text, std::string_view name);
+
+/// Reads and checks a host file. Throws HostFileError, also when it cannot be read.
+HostFile loadHostFile(const std::string& path);
+
+/// The host file of this process, read at the first call: the file that $KSP_HOST_FILE names, else
+/// /etc/brellium/host.toml, else the built-in default. Throws HostFileError.
+const HostFile& hostFile();
+
+/// Writes a fault to standard error, as the one line of a start that ends there.
+void report(const HostFileError& fault);
+
+}  // namespace host

@@ -1,0 +1,178 @@
+#include "tests/scripted_platform.h"
+
+#include <syslog.h>
+#include <unistd.h>
+
+#include <cstdarg>
+#include <cstdio>
+
+#include "platform/background_activity.h"
+#include "platform/driver_service.h"
+#include "platform/system_log.h"
+
+namespace scripted {
+
+namespace {
+
+Script script;
+std::vector<std::string> recorded;
+std::vector<std::string> faults;
+std::map<uint32_t, std::string> services;
+std::set<uint32_t> connections;
+uint32_t lastService;
+int lookups;
+size_t stepsTaken;
+size_t questions;
+
+__attribute__((format(printf, 1, 2))) void record(const char* format, ...) {
+  char text[256];
+  va_list arguments;
+  va_start(arguments, format);
+  std::vsnprintf(text, sizeof text, format, arguments);
+  va_end(arguments);
+  recorded.emplace_back(text);
+}
+
+void recordLog(const char* sink, const char* format, va_list arguments) {
+  char text[256];
+  std::vsnprintf(text, sizeof text, format, arguments);
+  recorded.push_back(std::string(sink) + text);
+}
+
+std::string hex(const void* bytes, size_t size) {
+  std::string text;
+  for (size_t i = 0; i < size; ++i) {
+    char digits[3];
+    std::snprintf(digits, sizeof digits, "%02x", static_cast<const unsigned char*>(bytes)[i]);
+    text += digits;
+  }
+  return text;
+}
+
+}  // namespace
+
+void play(Script next) {
+  script = std::move(next);
+  recorded.clear();
+  faults.clear();
+  services.clear();
+  connections.clear();
+  lastService = 0x100;
+  lookups = 0;
+  stepsTaken = questions = 0;
+}
+
+const std::vector<std::string>& calls() {
+  return recorded;
+}
+
+std::vector<std::string> unbalanced() {
+  std::vector<std::string> all = faults;
+  for (const auto& [service, className] : services) all.push_back("service of " + className + " is held");
+  for (const uint32_t connection : connections)
+    all.push_back("connection " + std::to_string(connection) + " is open");
+  return all;
+}
+
+}  // namespace scripted
+
+using namespace scripted;
+
+struct MatchingRequest {
+  std::string className;
+};
+struct ActivityCriteria {};
+
+extern "C" {
+
+const char PropertyMatchKey[] = "PropertyMatch";
+const ActivityCriteria kCheckIn;
+const ActivityCriteria* const ActivityCheckIn = &kCheckIn;
+
+MatchingRequest* ServiceMatchByClass(const char* className) {
+  if (script.unmatchable.count(className) != 0) return nullptr;
+  return new MatchingRequest{className};
+}
+
+uint32_t GetMatchingService(uint32_t registry, MatchingRequest* request) {
+  const std::string className = request->className;
+  delete request;
+  if (registry != DefaultRegistry || script.present.count(className) == 0) return 0;
+  if (script.missingLookups.count(++lookups) != 0) return 0;
+  services[++lastService] = className;
+  return lastService;
+}
+
+int32_t OpenServiceConnection(uint32_t service, int32_t process, uint32_t type, uint32_t* connection) {
+  record("open %x type %u%s", service, type, process == getpid() ? "" : " for another process");
+  const OpenAnswer answer = script.opens[services.at(service)];
+  if (answer.setsHandle) *connection = answer.handle;
+  if (answer.result == 0 && answer.handle != 0) connections.insert(answer.handle);
+  return answer.result;
+}
+
+int32_t CallStructMethod(uint32_t connection, uint32_t method, const void* input, size_t inputSize,
+                         void* output, size_t* outputSize) {
+  record("call %x method %u %s out %s/%zu", connection, method, hex(input, inputSize).c_str(),
+         hex(output, *outputSize).c_str(), *outputSize);
+  const StepAnswer answer = script.steps.at(stepsTaken++);
+  for (unsigned i = 0; i < 4; ++i) static_cast<unsigned char*>(output)[i] = (answer.reply >> (8 * i)) & 0xFF;
+  *outputSize = 0;
+  return answer.result;
+}
+
+int32_t CloseServiceConnection(uint32_t connection) {
+  record("close %x", connection);
+  if (connection != 0 && connections.erase(connection) == 0) faults.emplace_back("closed what is not open");
+  return script.closeResult;
+}
+
+int32_t ReleaseServiceObject(uint32_t service) {
+  record("release %x", service);
+  if (services.erase(service) == 0) faults.emplace_back("released what is not held");
+  return 0;
+}
+
+void RegisterActivity(const char* identifier, const ActivityCriteria* criteria, ActivityHandler) {
+  record("register %s%s", identifier, criteria == ActivityCheckIn ? " check-in" : "");
+}
+
+int GetActivityState(Activity*) {
+  record("state?");
+  return script.state;
+}
+
+bool ActivityShouldDefer(Activity*) {
+  record("defer?");
+  return questions < script.yields.size() && script.yields[questions++];
+}
+
+bool SetActivityState(Activity*, int state) {
+  record("set state %d", state);
+  return true;
+}
+
+void ExitTransactionClean() {
+  record("clean");
+}
+
+void SystemLog(const char* format, ...) {
+  va_list arguments;
+  va_start(arguments, format);
+  recordLog("log: ", format, arguments);
+  va_end(arguments);
+}
+
+void syslog(int priority, const char* format, ...) {
+  va_list arguments;
+  va_start(arguments, format);
+  recordLog(priority == LOG_NOTICE ? "notice: " : "syslog: ", format, arguments);
+  va_end(arguments);
+}
+
+unsigned sleep(unsigned seconds) {
+  record("sleep %u", seconds);
+  return 0;
+}
+
+}  // extern "C"
