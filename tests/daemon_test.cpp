@@ -69,6 +69,10 @@ struct Case {
   Calls calls;
 };
 
+void PrintTo(const Case& each, std::ostream* out) {
+  *out << each.name;
+}
+
 class Handler : public testing::TestWithParam<Case> {};
 
 TEST_P(Handler, CallsAndLogsInOrder) {

@@ -33,7 +33,8 @@ __attribute__((format(printf, 1, 2))) void record(const char* format, ...) {
   recorded.emplace_back(text);
 }
 
-void recordLog(const char* sink, const char* format, va_list arguments) {
+__attribute__((format(printf, 2, 0))) void recordLog(const char* sink, const char* format,
+                                                     va_list arguments) {
   char text[256];
   std::vsnprintf(text, sizeof text, format, arguments);
   recorded.push_back(std::string(sink) + text);
