@@ -2,7 +2,7 @@
 
 #include <gtest/gtest.h>
 
-#include <cstring>
+#include <algorithm>
 
 #include "ksp/connection.h"
 #include "tests/scripted_platform.h"
@@ -33,8 +33,8 @@ TEST(ExporterTable, RowsDifferInMethodsAndMediaStatistics) {
     EXPECT_EQ(kRows[row].secondaryMethod, row == 2 ? 8u : 9u);
     EXPECT_EQ(kRows[row].extraMethod, row == 2 ? 5u : 0xFFFFFFFFu);
   }
-  const ExporterEntry terminator = {};
-  EXPECT_EQ(std::memcmp(&kRows[3], &terminator, sizeof terminator), 0);
+  const auto* terminator = reinterpret_cast<const char*>(&kRows[3]);
+  EXPECT_EQ(std::count(terminator, terminator + sizeof(ExporterEntry), 0), sizeof(ExporterEntry));
 }
 
 TEST(Lookup, TakesTheFirstRowThatIsPresent) {
