@@ -10,7 +10,7 @@
 
 #include <stdbool.h>
 
-#include "platform/api.h"
+#include "api.h"
 
 PLATFORM_BEGIN_DECLARATIONS
 

@@ -11,7 +11,7 @@
 #include <stddef.h>
 #include <stdint.h>
 
-#include "platform/api.h"
+#include "api.h"
 
 PLATFORM_BEGIN_DECLARATIONS
 

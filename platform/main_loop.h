@@ -1,7 +1,7 @@
 #ifndef PLATFORM_MAIN_LOOP_H
 #define PLATFORM_MAIN_LOOP_H
 
-#include "platform/api.h"
+#include "api.h"
 
 PLATFORM_BEGIN_DECLARATIONS
 

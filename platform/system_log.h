@@ -1,7 +1,7 @@
 #ifndef PLATFORM_SYSTEM_LOG_H
 #define PLATFORM_SYSTEM_LOG_H
 
-#include "platform/api.h"
+#include "api.h"
 
 PLATFORM_BEGIN_DECLARATIONS
 

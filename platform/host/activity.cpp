@@ -45,7 +45,7 @@ struct Activity {
   }
 
   void stop(int signal) {
-    host::note("%s: asking the activity to yield, then ending the process", sigdescr_np(signal));
+    host::note("SIG%s: asking the activity to yield, then ending the process", sigabbrev_np(signal));
     {
       const std::lock_guard lock(mutex_);
       stopped_ = true;

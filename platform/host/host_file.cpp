@@ -244,7 +244,8 @@ HostFile loadHostFile(const std::string& path) {
 
 const HostFile& hostFile() {
   static const HostFile file = [] {
-    if (const char* named = secure_getenv("KSP_HOST_FILE")) return loadHostFile(named);
+    const char* named = secure_getenv("KSP_HOST_FILE");
+    if (named != nullptr && *named != 0) return loadHostFile(named);
     struct stat ignored = {};
     if (stat(kSystemFile, &ignored) == 0 || errno != ENOENT) return loadHostFile(kSystemFile);
     return parseHostFile(kDefaultHost, "built-in host file");
