@@ -1,4 +1,7 @@
 #include "ksp/exporter.h"
+
+#include "ksp/media_statistics.h"
+#include "ksp/statistics.h"
 #include "platform/driver_service.h"
 
 // Selector numbers of the controller's commands.
@@ -48,9 +51,15 @@ struct Methods {
   uint32_t secondary;
 };
 
+// How a controller exports media statistics; empty when it does not.
+struct MediaStatistics {
+  SelectorAccessor selector = nullptr;
+  decltype(&KSPMSPParseBufferToCxt) parser = nullptr;
+};
+
 // The controllers differ in name, driver methods and whether they export media statistics, in nothing else.
 constexpr ExporterEntry controllerRow(const char* className, const char* propertyKey, Methods methods,
-                                      SelectorAccessor mspStats) {
+                                      MediaStatistics media) {
   return {
       .className = className,
       .propertyKey = propertyKey,
@@ -61,19 +70,19 @@ constexpr ExporterEntry controllerRow(const char* className, const char* propert
       .secondaryMethod = methods.secondary,
       .getStatsSelector = getStatsSelector,
       .getReadStatsSelector = getReadStatsSelector,
-      .getMspStatsSelector = mspStats,
+      .getMspStatsSelector = media.selector,
       .getDefectsListSelector = getDefectsListSelector,
       .getTelemetryListSelectors = getTelemetryListSelectors,
       .getTaskSchedulerSelectors = getTaskSchedulerSelectors,
       .getSnapshotSelectors = getSnapshotSelectors,
       .getSnapshotHeaderSelectors = getSnapshotHeaderSelectors,
       .getBandStatsSelector = getBandStatsSelector,
-      .parseBuffer = nullptr,
-      .releaseContext = nullptr,
-      .parseMspBuffer = nullptr,
-      .parseFtlBuffer = nullptr,
-      .parseStatKeyBuffer = nullptr,
-      .releaseGenericContext = nullptr,
+      .parseBuffer = KSPParseBufferToCxt,
+      .releaseContext = KSPReleaseContext,
+      .parseMspBuffer = media.parser,
+      .parseFtlBuffer = KSPFTLParseBufferToCxt,
+      .parseStatKeyBuffer = KSPFTLParseStatKeyBufferToCxt,
+      .releaseGenericContext = ReleaseGenericParserCxt,
   };
 }
 
@@ -84,8 +93,9 @@ constexpr char kCharacteristics[] = "Controller Characteristics";
 }  // namespace
 
 constinit ExporterEntry nand_exporters_tunnel[KSPExporterRows] = {
-    controllerRow("VantorFlash3NVMeController", kCharacteristics, kNvmeMethods, getMspStatsSelector),
-    controllerRow("VantorEmbeddedNVMeController", kCharacteristics, kNvmeMethods, nullptr),
-    controllerRow("KSPStorage", PropertyMatchKey, kStorageMethods, nullptr),
+    controllerRow("VantorFlash3NVMeController", kCharacteristics, kNvmeMethods,
+                  {getMspStatsSelector, KSPMSPParseBufferToCxt}),
+    controllerRow("VantorEmbeddedNVMeController", kCharacteristics, kNvmeMethods, {}),
+    controllerRow("KSPStorage", PropertyMatchKey, kStorageMethods, {}),
     {},
 };
