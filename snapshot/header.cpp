@@ -1,8 +1,15 @@
 #include "snapshot/header.h"
 
+#include <algorithm>
 #include <cstring>
 
 namespace ksp {
+
+namespace {
+
+constexpr uint64_t kWordBytes = 4;
+
+}  // namespace
 
 FieldDescriptor SnapshotHeader::descriptor(uint32_t index) const {
   const uint8_t* bytes =
@@ -13,6 +20,23 @@ FieldDescriptor SnapshotHeader::descriptor(uint32_t index) const {
       .size = loadWord(bytes + 8),
       .format = reinterpret_cast<const char*>(bytes + 12),
   };
+}
+
+uint32_t SnapshotHeader::endOfRecords(uint64_t length) const {
+  const uint32_t last = std::max(recordCount(), 1U) - 1;
+  if (recordSize() == 0) return last;
+  return static_cast<uint32_t>(std::min<uint64_t>(last, length / recordSize()));
+}
+
+bool SnapshotHeader::holds(const FieldDescriptor& field) const {
+  const uint64_t size = field.type == kFieldTriples ? field.size : kWordBytes;
+  return field.offset + size <= recordSize();
+}
+
+bool SnapshotHeader::hasKey() const {
+  if (descriptorCount() == 0) return false;
+  const FieldDescriptor first = descriptor(0);
+  return holds(first) && first.offset + kWordBytes <= recordSize();
 }
 
 const char* snapshotHeaderFault(const void* header, uint64_t size) {

@@ -45,6 +45,24 @@ class SnapshotHeader {
   uint32_t descriptorCount() const { return loadWord(bytes_ + tableOffset()); }
   FieldDescriptor descriptor(uint32_t index) const;
 
+  /// Offset of a record from the first one: a product of 32 bits, as the controller computes it.
+  uint32_t recordOffset(uint32_t index) const { return index * recordSize(); }
+
+  /// The first record index that is not rendered, of records in `length` bytes: the last slot, or the first
+  /// one that does not lie wholly in them.
+  ///
+  /// A product of 32 bits comes back into the buffer again and again, so the records that the buffer has room
+  /// for are the bound: no start lies behind index times size, all of them are inside, and no walk over them
+  /// is longer than the buffer.
+  uint32_t endOfRecords(uint64_t length) const;
+
+  /// Whether a field lies within a record.
+  bool holds(const FieldDescriptor& field) const;
+
+  /// Whether a record's key, the first word of the first descriptor's field, can be read; without one no slot
+  /// is in use.
+  bool hasKey() const;
+
  private:
   const uint8_t* bytes_;
 };

@@ -1,6 +1,5 @@
 #include <sys/time.h>
 
-#include <algorithm>
 #include <cstdint>
 #include <ctime>
 
@@ -18,8 +17,6 @@ using ksp::FieldDescriptor;
 using ksp::loadWord;
 using ksp::PieceWriter;
 using ksp::SnapshotHeader;
-
-constexpr uint64_t kWordBytes = 4;
 
 void writeCaptureTime(PieceWriter& page) {
   timeval now = {};
@@ -41,30 +38,6 @@ void writeHeading(PieceWriter& page, const SnapshotHeader& header) {
   page.text("- KSP Snapshot - \n");
   page.text(header.title());
   page.text("\n");
-}
-
-// The first record index that is not rendered: the last slot, or the first one behind `length` bytes.
-//
-// Where a record starts is a product of 32 bits, so with a size and a count that a hostile header chose, it
-// comes back into the buffer again and again. The records that a buffer can hold bound the walk instead: no
-// such record's start lies behind index times size, so all of it is inside, and no walk is longer than the
-// buffer.
-uint32_t endOfRecords(const SnapshotHeader& header, uint64_t length) {
-  const uint32_t last = std::max(header.recordCount(), 1U) - 1;
-  if (header.recordSize() == 0) return last;
-  return static_cast<uint32_t>(std::min<uint64_t>(last, length / header.recordSize()));
-}
-
-bool liesWithin(const FieldDescriptor& field, uint32_t recordSize) {
-  const uint64_t size = field.type == ksp::kFieldTriples ? field.size : kWordBytes;
-  return field.offset + size <= recordSize;
-}
-
-// Whether a record's key, the first word of its first field, can be read: without one, no slot is in use.
-bool hasKey(const SnapshotHeader& header) {
-  if (header.descriptorCount() == 0) return false;
-  const FieldDescriptor first = header.descriptor(0);
-  return liesWithin(first, header.recordSize()) && first.offset + kWordBytes <= header.recordSize();
 }
 
 void writeField(PieceWriter& page, const FieldDescriptor& field, const uint8_t* bytes) {
@@ -91,7 +64,7 @@ void writeLine(PieceWriter& page, const SnapshotHeader& header, const uint8_t* r
   const uint32_t count = header.descriptorCount();
   for (uint32_t i = 0; i < count && page.fits(); ++i) {
     const FieldDescriptor field = header.descriptor(i);
-    if (liesWithin(field, header.recordSize()) && ksp::formatIsSafe(field)) {
+    if (header.holds(field) && ksp::formatIsSafe(field)) {
       writeField(page, field, record + field.offset);
     }
   }
@@ -105,10 +78,10 @@ bool writePage(PieceWriter& page, const void* records, uint64_t length, const Sn
   if (cursor == 0) writeHeading(page, header);
   if (!page.fits()) return false;
 
-  const uint32_t end = endOfRecords(header, length);
-  if (cursor < end && !hasKey(header)) cursor = end;
+  const uint32_t end = header.endOfRecords(length);
+  if (cursor < end && !header.hasKey()) cursor = end;
   while (cursor < end) {
-    const uint32_t offset = cursor++ * header.recordSize();
+    const uint32_t offset = header.recordOffset(cursor++);
     const uint8_t* record = static_cast<const uint8_t*>(records) + offset;
     if (loadWord(record + header.descriptor(0).offset) == 0) continue;
     writeLine(page, header, record);

@@ -6,37 +6,13 @@
 #include "ksp/snapshot.h"
 #include "snapshot/legend.h"
 #include "snapshot/number.h"
+#include "snapshot/record_layout.h"
 #include "snapshot/triples.h"
 #include "snapshot/writer.h"
 
 namespace {
 
-using ksp::loadWord;
-using ksp::NumberFormat;
-
-constexpr uint64_t kRecordBytes = 252;
-constexpr size_t kWordBytes = 4;
-constexpr size_t kPriorities = 4;
-
-// Words of a record that are not just numbers with a label.
-constexpr size_t kWriteTriples = 2;
-constexpr size_t kReadTriples = 14;
-constexpr size_t kHysteresis = 39;
-
-struct Field {
-  NumberFormat format;
-  size_t word;
-};
-
-constexpr Field kBeforeHysteresis[] = {
-    {"T=%04u", 0}, {" E=%02u", 26}, {" HR=%4u", 27}, {" HW=%4u", 28}, {" NR=%4u", 29}, {" NW=%4u", 30},
-};
-
-constexpr Field kAfterHysteresis[] = {
-    {" GC=%4u", 31}, {" W=%2u", 33}, {" BI=%3u", 36}, {" BU=%3u", 37}, {" V=%5u", 45}, {" BF=%2u", 47},
-    {"/%2u", 48},    {" P=%2u", 1},  {" H=%2u", 41},  {"/%2u", 40},    {" X=%2u", 50}, {"/%2u", 51},
-    {" L=%3u", 43},  {"/%3u", 44},   {" C=%2u", 53},  {"/%2u", 54},    {" S=%4u", 42}, {" U=%8u", 52},
-};
+using namespace ksp;
 
 constexpr size_t kNumbers = std::size(kBeforeHysteresis) + 2 + std::size(kAfterHysteresis) +
                             2 * std::size(ksp::kTripleColumns) * kPriorities;
@@ -62,8 +38,8 @@ class Line {
 
  private:
   template <size_t Count>
-  void write(const uint8_t* record, const Field (&fields)[Count]) {
-    for (const Field& field : fields) number(field.format, loadWord(record + kWordBytes * field.word));
+  void write(const uint8_t* record, const RecordField (&fields)[Count]) {
+    for (const RecordField& field : fields) number(field.format, loadWord(record + kWordBytes * field.word));
   }
 
   void write(const uint8_t* record, const char (&direction)[3], size_t firstWord) {

@@ -1,0 +1,90 @@
+#include "tools/kspdump/capture.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <limits>
+
+namespace kspdump {
+
+namespace {
+
+constexpr size_t kMostFindings = 100;
+/// The parsers take lengths of 32 bits.
+constexpr size_t kGreatestCapture = std::numeric_limits<uint32_t>::max();
+constexpr size_t kLeastRead = size_t{1} << 16;
+
+class Descriptor {
+ public:
+  explicit Descriptor(const std::string& path)
+      : number_(path == "-" ? STDIN_FILENO : open(path.c_str(), O_RDONLY | O_CLOEXEC)) {}
+  Descriptor(const Descriptor&) = delete;
+  Descriptor& operator=(const Descriptor&) = delete;
+  ~Descriptor() {
+    if (number_ > STDIN_FILENO) close(number_);
+  }
+
+  int number() const { return number_; }
+
+ private:
+  int number_;
+};
+
+}  // namespace
+
+std::string_view kindName(Kind kind) {
+  constexpr std::string_view kNames[] = {"stats", "summary", "media", "snapshot"};
+  return kNames[static_cast<size_t>(kind)];
+}
+
+std::string_view kindTitle(Kind kind) {
+  constexpr std::string_view kTitles[] = {"statistics", "statistics summary", "media statistics", "snapshot"};
+  return kTitles[static_cast<size_t>(kind)];
+}
+
+void Capture::find(uint64_t offset, std::string reason) {
+  if (findings.size() < kMostFindings) {
+    findings.push_back({offset, std::move(reason)});
+  } else {
+    ++furtherFindings;
+  }
+}
+
+Wide Capture::sum(const Record& record) const {
+  Wide sum = 0;
+  for (size_t i = 0; i < record.valueCount; ++i) sum += valuesOf(record)[i];
+  return sum;
+}
+
+std::string recordName(const Record& record) {
+  return record.name.empty() ? "Stat_" + std::to_string(record.key) : std::string(record.name);
+}
+
+std::string readFile(const std::string& path, std::vector<unsigned char>& bytes) {
+  bytes.clear();
+  const Descriptor file(path);
+  struct stat status = {};
+  if (file.number() < 0 || fstat(file.number(), &status) != 0) return std::strerror(errno);
+  // One byte more than the file is said to hold, so that its end is seen without growing.
+  const size_t expected = S_ISREG(status.st_mode) ? static_cast<size_t>(status.st_size) + 1 : kLeastRead;
+  size_t size = 0;
+  for (;;) {
+    if (size > kGreatestCapture) return "larger than 4 GiB";
+    if (size == bytes.size()) {
+      bytes.resize(std::min(std::max({expected, kLeastRead, size * 2}), kGreatestCapture + 1));
+    }
+    const ssize_t got = read(file.number(), bytes.data() + size, bytes.size() - size);
+    if (got < 0 && errno == EINTR) continue;
+    if (got < 0) return std::strerror(errno);
+    if (got == 0) break;
+    size += static_cast<size_t>(got);
+  }
+  bytes.resize(size);
+  return "";
+}
+
+}  // namespace kspdump

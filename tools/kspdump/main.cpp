@@ -1,0 +1,303 @@
+// kspdump: decodes captures of the controller's exports for people and programs.
+
+#include <sys/ioctl.h>
+#include <unistd.h>
+
+#include <CLI/CLI.hpp>
+#include <algorithm>
+#include <chrono>
+#include <clocale>
+#include <cstdio>
+#include <cstdlib>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "tools/kspdump/capture.h"
+#include "tools/kspdump/decode.h"
+#include "tools/kspdump/diff.h"
+#include "tools/kspdump/in_order.h"
+#include "tools/kspdump/output.h"
+#include "tools/kspdump/render.h"
+#include "tools/kspdump/snapshot.h"
+#include "tools/kspdump/text.h"
+
+namespace {
+
+using namespace kspdump;
+
+/// Exit statuses; the greatest that applies is the program's.
+enum Status : int { kClean = 0, kFindings = 1, kUsage = 2, kUnreadable = 3 };
+
+struct Options {
+  Decoding decoding;
+  Format format = Format::kTable;
+  std::vector<std::string> files;
+  std::string header;
+  std::string output;
+  size_t jobs = std::max(1U, std::thread::hardware_concurrency());
+  bool isDiff = false;
+};
+
+size_t terminalWidth() {
+  constexpr size_t kUsual = 80;
+  winsize size = {};
+  if (ioctl(STDOUT_FILENO, TIOCGWINSZ, &size) == 0 && size.ws_col != 0) return size.ws_col;
+  return kUsual;
+}
+
+/// How far many files are, on one line of a terminal that nothing else is written to.
+class Progress {
+ public:
+  explicit Progress(size_t files)
+      : files_(files), shown_(files > 1 && isatty(STDERR_FILENO) != 0 && isatty(STDOUT_FILENO) == 0) {}
+
+  void show(size_t done) {
+    const auto now = std::chrono::steady_clock::now();
+    if (!shown_ || now - last_ < std::chrono::milliseconds(100)) return;
+    last_ = now;
+    std::fprintf(stderr, "\r%zu of %zu files", done, files_);
+  }
+
+  void hide() {
+    if (shown_ && last_ != std::chrono::steady_clock::time_point{}) std::fputs("\r\x1b[K", stderr);
+  }
+
+ private:
+  size_t files_;
+  bool shown_;
+  std::chrono::steady_clock::time_point last_;
+};
+
+void complain(const std::string& source, const std::string& text) {
+  std::fprintf(stderr, "kspdump: %s: %s\n", printable(source).c_str(), text.c_str());
+}
+
+/// Names a capture's findings on standard error.
+int tell(const Capture& capture) {
+  for (const Finding& finding : capture.findings) {
+    complain(capture.source, "offset " + std::to_string(finding.offset) + ": " + finding.reason);
+  }
+  if (capture.furtherFindings != 0) {
+    complain(capture.source, std::to_string(capture.furtherFindings) + " further findings");
+  }
+  return capture.isClean() ? kClean : kFindings;
+}
+
+/// A file's way through the program: why it cannot be read, or what was decoded and rendered.
+struct Job {
+  std::string unreadable;
+  Capture capture;
+  std::string text;
+};
+
+Job decodeFile(const std::string& file, const Options& options) {
+  thread_local std::vector<unsigned char> bytes;
+  Job job;
+  job.unreadable = readFile(file, bytes);
+  if (job.unreadable.empty()) job.capture = decode(bytes, file, options.decoding);
+  return job;
+}
+
+void render(Job& job, Format format, size_t width) {
+  switch (format) {
+    case Format::kTable:
+      renderTable(job.text, job.capture, width);
+      break;
+    case Format::kJson:
+      renderJson(job.text, job.capture);
+      break;
+    case Format::kCsv:
+      renderCsv(job.text, job.capture);
+      break;
+    case Format::kOpenMetrics:
+      break;  // gathered from all files, then rendered
+  }
+}
+
+int dump(const Options& options, Output& output) {
+  const size_t width = terminalWidth();
+  Progress progress(options.files.size());
+  OpenMetrics metrics;
+  bool isFirst = true;
+  int status = kClean;
+
+  if (options.format == Format::kCsv) output.write(kCsvHead);
+  inOrder(
+      options.files.size(), std::min(options.jobs, options.files.size()),
+      [&](size_t index) {
+        Job job = decodeFile(options.files[index], options);
+        if (job.unreadable.empty()) render(job, options.format, width);
+        return job;
+      },
+      [&](size_t index, Job& job) {
+        progress.hide();
+        if (!job.unreadable.empty()) {
+          complain(options.files[index], "cannot be read: " + job.unreadable);
+          status = std::max<int>(status, kUnreadable);
+        } else {
+          if (options.format == Format::kOpenMetrics) metrics.add(job.capture);
+          if (options.format == Format::kTable && !isFirst) output.write("\n");
+          isFirst = false;
+          output.write(job.text);
+          status = std::max(status, tell(job.capture));
+        }
+        progress.show(index + 1);
+      });
+  progress.hide();
+  if (options.format == Format::kOpenMetrics) output.write(metrics.text());
+  return status;
+}
+
+int diff(const Options& options, Output& output) {
+  Job jobs[2];
+  int status = kClean;
+  for (size_t i = 0; i < 2; ++i) {
+    jobs[i] = decodeFile(options.files[i], options);
+    if (jobs[i].unreadable.empty()) {
+      status = std::max(status, tell(jobs[i].capture));
+    } else {
+      complain(options.files[i], "cannot be read: " + jobs[i].unreadable);
+      status = kUnreadable;
+    }
+  }
+  if (status != kUnreadable) {
+    output.write(renderDiff(jobs[0].capture, jobs[1].capture, options.format, terminalWidth()));
+  }
+  return status;
+}
+
+int report(const Options& options, Output& output) {
+  const std::string& file = options.files.front();
+  std::vector<unsigned char> bytes;
+  const std::string unreadable = readFile(file, bytes);
+  if (!unreadable.empty()) {
+    complain(file, "cannot be read: " + unreadable);
+    return kUnreadable;
+  }
+  Capture capture;
+  capture.source = file;
+  findSnapshotFaults(capture, bytes, options.decoding.header);
+  reportSnapshot(capture, bytes, options.decoding.header, [&](std::string_view text) { output.write(text); });
+  return tell(capture);
+}
+
+int run(Options& options) {
+  std::vector<unsigned char> header;
+  if (!options.header.empty()) {
+    std::string fault = readFile(options.header, header);
+    if (!fault.empty()) {
+      fault = "cannot be read: " + fault;
+    } else if (const char* wrong = headerFault(header)) {
+      fault = std::string("the header ") + wrong;
+    }
+    if (!fault.empty()) {
+      complain(options.header, fault);
+      return kUnreadable;
+    }
+    options.decoding.header = header;
+  }
+  Output output(options.output);
+  // The report is a snapshot's table, unless it is only some of the fields that are asked for.
+  const bool asReport = options.decoding.kind == Kind::kSnapshot && options.format == Format::kTable &&
+                        options.decoding.match.empty();
+  const int status = options.isDiff ? diff(options, output)
+                     : asReport     ? report(options, output)
+                                    : dump(options, output);
+  output.finish();
+  return status;
+}
+
+class CommandLine {
+ public:
+  explicit CommandLine(Options& options) : options_(options) {
+    app_.set_version_flag("--version", "kspdump " KSP_VERSION);
+    app_.require_subcommand(1);
+    app_.footer(
+        "FILE may be - for standard input. Exit status: 0 clean, 1 decoded with findings, which are named "
+        "on\n"
+        "standard error, 2 wrong usage, 3 a file could not be read or written.");
+
+    CLI::App* stats = addMany("stats", "Decode statistics streams", Kind::kStats);
+    stats->add_flag("--numbers", options_.decoding.byNumber, "Name records by their key number");
+    addMany("summary", "Decode the summary block of statistics streams", Kind::kSummary);
+    addMany("media", "Decode media statistics streams", Kind::kMedia);
+    CLI::App* snapshot =
+        app_.add_subcommand("snapshot", "Render a snapshot: the fixed layout, or a header's");
+    snapshot->add_option("FILE", options_.files, "The capture")->required()->expected(1)->type_name("");
+    snapshot->add_option("--header", options_.header, "Header that describes the records")
+        ->type_name("HEADER");
+    addCommon(*snapshot, Kind::kSnapshot);
+
+    CLI::App* diff = app_.add_subcommand("diff", "Show what changed between two captures");
+    diff->require_subcommand(1);
+    for (const auto& [name, kind] : {std::pair{"stats", Kind::kStats}, std::pair{"media", Kind::kMedia}}) {
+      CLI::App* what = diff->add_subcommand(name, std::string("Compare two ") + name + " captures");
+      what->add_option("OLD NEW", options_.files, "The two captures")->required()->expected(2)->type_name("");
+      addCommon(*what, kind);
+      what->parse_complete_callback([this] { options_.isDiff = true; });
+    }
+  }
+
+  /// Returns the exit status where the program ends with its command line, else -1.
+  int parse(int argc, char** argv) {
+    try {
+      app_.parse(argc, argv);
+      return -1;
+    } catch (const CLI::ParseError& error) {
+      return app_.exit(error) == 0 ? kClean : kUsage;
+    }
+  }
+
+ private:
+  CLI::App* addMany(const char* name, const char* description, Kind kind) {
+    CLI::App* command = app_.add_subcommand(name, description);
+    command->add_option("FILE", options_.files, "Captures")->required()->type_name("");
+    command
+        ->add_option("--jobs", options_.jobs, "Files decoded at the same time, as many as cores by default")
+        ->check(CLI::Range(1, 1024))
+        ->option_text("N");
+    addCommon(*command, kind);
+    return command;
+  }
+
+  void addCommon(CLI::App& command, Kind kind) {
+    command.add_option("--format", format_, "table, json, csv or openmetrics")
+        ->check(CLI::IsMember(std::vector<std::string>(std::begin(kFormatNames), std::end(kFormatNames))))
+        ->option_text("FORMAT");
+    command.add_option("--match", options_.decoding.match, "Only records whose name matches the pattern")
+        ->type_name("GLOB");
+    command.add_option("--output", options_.output, "Write to a file instead of standard output")
+        ->type_name("FILE");
+    command.callback([this, kind] {
+      options_.decoding.kind = kind;
+      options_.format = static_cast<Format>(
+          std::find(std::begin(kFormatNames), std::end(kFormatNames), format_) - std::begin(kFormatNames));
+    });
+  }
+
+  /// In the order of Format.
+  static constexpr const char* kFormatNames[] = {"table", "json", "csv", "openmetrics"};
+
+  Options& options_;
+  std::string format_ = kFormatNames[0];
+  CLI::App app_{"Decodes captures of a flash storage controller's exports.", "kspdump"};
+};
+
+}  // namespace
+
+int main(int argc, char** argv) {
+  std::setlocale(LC_CTYPE, "");
+  Options options;
+  CommandLine commandLine(options);
+  const int ended = commandLine.parse(argc, argv);
+  if (ended >= 0) return ended;
+  try {
+    return run(options);
+  } catch (const std::bad_alloc&) {
+    std::fputs("kspdump: out of memory\n", stderr);
+  } catch (const std::exception& error) {
+    std::fprintf(stderr, "kspdump: %s\n", error.what());
+  }
+  return kUnreadable;
+}

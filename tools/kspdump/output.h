@@ -1,0 +1,34 @@
+#pragma once
+
+#include <string>
+#include <string_view>
+
+namespace kspdump {
+
+/// Where the results go: standard output, or a file that takes its name only once it is whole.
+///
+/// What exists under that name stays as it was until then; a pipe or a device is written to directly. A
+/// reader that goes away ends the program as the system does, without a word.
+class Output {
+ public:
+  /// An empty path is standard output. Throws std::system_error.
+  explicit Output(std::string path);
+  Output(const Output&) = delete;
+  Output& operator=(const Output&) = delete;
+  ~Output();
+
+  /// Throws std::system_error.
+  void write(std::string_view text);
+
+  /// Gives the file its name. Throws std::system_error.
+  void finish();
+
+ private:
+  [[noreturn]] void fail(const char* what) const;
+
+  std::string path_;
+  std::string unfinished_;
+  int descriptor_;
+};
+
+}  // namespace kspdump
