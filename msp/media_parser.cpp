@@ -21,12 +21,13 @@ uint32_t KSPMSPParseBufferToCxt(GenericParserContext* context, const void* buffe
     const unsigned number = key->key;
     const unsigned count = key->count;
     const unsigned width = key->width;
+    ksp::Elements elements = {record.value, width, count};
     if (record.length != count * width) {
       SetAPIErrorMessage(
           "KSPMSPParseBufferToCxt: %s(%u): cfg %u elements; (%u*%u) cfg bytes != (%u) buffer bytes",
           key->name.data(), number, count, count, width, unsigned{record.length});
+      elements.count = std::min(record.length / width, count);
     }
-    const ksp::Elements elements = {record.value, width, std::min(record.length / width, count)};
     if (!ksp::appendElements(context, elements, key->name)) {
       SetAPIErrorMessage("KSPMSPParseBufferToCxt: %s(%u): Error adding %u elements to context",
                          key->name.data(), number, count);

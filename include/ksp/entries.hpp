@@ -30,7 +30,7 @@ struct Entry {
 ///
 /// It refers to the nodes that the context held when the view was made; appending to the context goes well
 /// with it, releasing the context does not.
-class EntryView : public std::ranges::view_interface<EntryView> {
+class EntryView : public std::ranges::view_base {
  public:
   class Iterator {
    public:
@@ -67,10 +67,19 @@ class EntryView : public std::ranges::view_interface<EntryView> {
 
   [[nodiscard]] Iterator begin() const { return first_; }
   [[nodiscard]] std::default_sentinel_t end() const { return {}; }
+  [[nodiscard]] bool empty() const { return first_ == end(); }
 
  private:
   Iterator first_;
 };
+
+}  // namespace ksp
+
+/// Iterators outlive the view that they came from.
+template <>
+inline constexpr bool std::ranges::enable_borrowed_range<ksp::EntryView> = true;
+
+namespace ksp {
 
 /// A context that starts empty, releases its entries at the end of its life, and can be moved but not copied.
 template <class Context, void (*release)(Context*)>

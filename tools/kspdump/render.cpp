@@ -47,7 +47,8 @@ void renderBars(std::string& out, const std::vector<Wide>& values, size_t width)
 
 void renderTable(std::string& out, const Capture& capture, size_t width) {
   out += printable(capture.source) + ": " + std::string(kindTitle(capture.kind)) + ", " +
-         std::to_string(capture.bytes) + " bytes, " + std::to_string(capture.recordCount) + " records";
+         std::to_string(capture.bytes) + " bytes, " + std::to_string(capture.recordCount) +
+         (capture.kind == Kind::kSnapshot ? " fields" : " records");
   if (capture.records.size() != capture.recordCount) {
     out += ", " + std::to_string(capture.records.size()) + " shown";
   }

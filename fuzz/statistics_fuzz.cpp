@@ -1,0 +1,6 @@
+#include "fuzz/context_check.h"
+#include "ksp/statistics.h"
+
+extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
+  return ksp::checkCounting(KSPFTLParseBufferToCxt, data, size);
+}
