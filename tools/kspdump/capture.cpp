@@ -46,6 +46,15 @@ std::string_view kindTitle(Kind kind) {
   return kTitles[static_cast<size_t>(kind)];
 }
 
+void Capture::clear() {
+  recordCount = 0;
+  records.clear();
+  values.clear();
+  findings.clear();
+  furtherFindings = 0;
+  labels.clear();
+}
+
 void Capture::find(uint64_t offset, std::string reason) {
   if (findings.size() < kMostFindings) {
     findings.push_back({offset, std::move(reason)});

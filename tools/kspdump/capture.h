@@ -50,6 +50,9 @@ struct Capture {
   /// What names of records refer to that stand in no key table.
   std::deque<std::string> labels;
 
+  /// Forgets everything but the room it takes.
+  void clear();
+
   void find(uint64_t offset, std::string reason);
   bool isClean() const { return findings.empty(); }
 

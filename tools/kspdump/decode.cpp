@@ -14,16 +14,13 @@
 #include "stats/stats_walk.h"
 #include "stats/summary.h"
 #include "tools/kspdump/snapshot.h"
+#include "tools/kspdump/text.h"
 
 namespace kspdump {
 
 namespace {
 
 using std::to_string;
-
-std::string counted(uint64_t count, const char* noun) {
-  return to_string(count) + " " + noun + (count == 1 ? "" : "s");
-}
 
 /// A record whose size is not the configured one is shown as far as it goes.
 void findSize(Capture& capture, uint64_t offset, std::string_view name, uint32_t key, uint64_t size,
@@ -170,9 +167,10 @@ void decodeSnapshotFields(Capture& capture, Bytes bytes, const Decoding& decodin
 
 }  // namespace
 
-Capture decode(std::span<const unsigned char> bytes, std::string source, const Decoding& decoding) {
-  Capture capture;
-  capture.source = std::move(source);
+void decode(std::span<const unsigned char> bytes, const std::string& source, const Decoding& decoding,
+            Capture& capture) {
+  capture.clear();
+  capture.source = source;
   capture.kind = decoding.kind;
   capture.bytes = bytes.size();
   switch (decoding.kind) {
@@ -189,7 +187,6 @@ Capture decode(std::span<const unsigned char> bytes, std::string source, const D
       decodeSnapshotFields(capture, bytes, decoding);
       break;
   }
-  return capture;
 }
 
 }  // namespace kspdump

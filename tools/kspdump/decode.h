@@ -18,7 +18,8 @@ struct Decoding {
   std::span<const unsigned char> header;
 };
 
-/// Decodes a capture as far as it goes and names whatever is wrong with it.
-Capture decode(std::span<const unsigned char> bytes, std::string source, const Decoding& decoding);
+/// Decodes a capture as far as it goes and names whatever is wrong with it; `capture` may hold another one.
+void decode(std::span<const unsigned char> bytes, const std::string& source, const Decoding& decoding,
+            Capture& capture);
 
 }  // namespace kspdump

@@ -4,69 +4,69 @@
 #include <cstddef>
 #include <exception>
 #include <mutex>
-#include <optional>
 #include <thread>
 #include <vector>
 
 namespace kspdump {
 
-/// Computes `make(0)` to `make(count - 1)` on `jobs` threads and hands the results to `take(index, result)`
-/// on this one, in order. Only a few results are held at a time. What `make` or `take` throws is thrown from
-/// here.
-template <class Make, class Take>
+/// Fills results `0` to `count - 1` by `make(index, result)` on `jobs` threads and hands them to
+/// `take(index, result)` on this one, in order. The results are few and used again and again, so what one has
+/// allocated serves the next. What `make` or `take` throws is thrown from here.
+template <class Result, class Make, class Take>
 void inOrder(size_t count, size_t jobs, Make make, Take take) {
-  using Result = decltype(make(size_t{}));
-  const size_t window = 4 * jobs;
-  std::vector<std::optional<Result>> results(window);
+  struct Slot {
+    Result result;
+    bool isFilled = false;
+  };
+  std::vector<Slot> slots(jobs == 1 ? 1 : 4 * jobs);
+  if (jobs == 1) {
+    for (size_t index = 0; index < count; ++index) {
+      make(index, slots[0].result);
+      take(index, slots[0].result);
+    }
+    return;
+  }
+
   std::mutex mutex;
   std::condition_variable changed;
   std::exception_ptr failure;
   size_t next = 0;
   size_t taken = 0;
-
+  // Calls `step` without the lock; what it throws ends all threads' work.
+  const auto unlocked = [&](std::unique_lock<std::mutex>& lock, const auto& step) {
+    lock.unlock();
+    std::exception_ptr thrown;
+    try {
+      step();
+    } catch (...) {
+      thrown = std::current_exception();
+    }
+    lock.lock();
+    if (thrown != nullptr) failure = thrown;
+    changed.notify_all();
+  };
   const auto work = [&] {
     std::unique_lock lock(mutex);
     for (;;) {
-      changed.wait(lock, [&] { return failure != nullptr || next == count || next < taken + window; });
+      changed.wait(lock, [&] { return failure != nullptr || next == count || next < taken + slots.size(); });
       if (failure != nullptr || next == count) return;
       const size_t index = next++;
-      lock.unlock();
-      std::optional<Result> result;
-      std::exception_ptr thrown;
-      try {
-        result.emplace(make(index));
-      } catch (...) {
-        thrown = std::current_exception();
-      }
-      lock.lock();
-      if (thrown != nullptr) {
-        failure = thrown;
-      } else {
-        results[index % window] = std::move(result);
-      }
-      changed.notify_all();
+      Slot& slot = slots[index % slots.size()];
+      unlocked(lock, [&] { make(index, slot.result); });
+      slot.isFilled = true;
     }
   };
 
   std::vector<std::jthread> workers;
   for (size_t i = 0; i < jobs; ++i) workers.emplace_back(work);
   std::unique_lock lock(mutex);
-  try {
-    while (taken < count) {
-      std::optional<Result>& slot = results[taken % window];
-      changed.wait(lock, [&] { return failure != nullptr || slot.has_value(); });
-      if (failure != nullptr) break;
-      Result result = std::move(*slot);
-      slot.reset();
-      lock.unlock();
-      take(taken, result);
-      lock.lock();
-      ++taken;
-      changed.notify_all();
-    }
-  } catch (...) {
-    if (!lock.owns_lock()) lock.lock();
-    failure = std::current_exception();
+  while (taken < count) {
+    Slot& slot = slots[taken % slots.size()];
+    changed.wait(lock, [&] { return failure != nullptr || slot.isFilled; });
+    if (failure != nullptr) break;
+    unlocked(lock, [&] { take(taken, slot.result); });
+    slot.isFilled = false;
+    ++taken;
     changed.notify_all();
   }
   lock.unlock();

@@ -91,12 +91,11 @@ struct Job {
   std::string text;
 };
 
-Job decodeFile(const std::string& file, const Options& options) {
+void decodeFile(const std::string& file, const Options& options, Job& job) {
   thread_local std::vector<unsigned char> bytes;
-  Job job;
+  job.text.clear();
   job.unreadable = readFile(file, bytes);
-  if (job.unreadable.empty()) job.capture = decode(bytes, file, options.decoding);
-  return job;
+  if (job.unreadable.empty()) decode(bytes, file, options.decoding, job.capture);
 }
 
 void render(Job& job, Format format, size_t width) {
@@ -123,12 +122,11 @@ int dump(const Options& options, Output& output) {
   int status = kClean;
 
   if (options.format == Format::kCsv) output.write(kCsvHead);
-  inOrder(
+  inOrder<Job>(
       options.files.size(), std::min(options.jobs, options.files.size()),
-      [&](size_t index) {
-        Job job = decodeFile(options.files[index], options);
+      [&](size_t index, Job& job) {
+        decodeFile(options.files[index], options, job);
         if (job.unreadable.empty()) render(job, options.format, width);
-        return job;
       },
       [&](size_t index, Job& job) {
         progress.hide();
@@ -153,7 +151,7 @@ int diff(const Options& options, Output& output) {
   Job jobs[2];
   int status = kClean;
   for (size_t i = 0; i < 2; ++i) {
-    jobs[i] = decodeFile(options.files[i], options);
+    decodeFile(options.files[i], options, jobs[i]);
     if (jobs[i].unreadable.empty()) {
       status = std::max(status, tell(jobs[i].capture));
     } else {

@@ -105,26 +105,48 @@ void renderJsonFindings(std::string& out, std::string_view member, const Capture
   }
 }
 
+namespace {
+
+/// Appends the records' part of a capture's JSON document.
+void renderJsonRecords(std::string& out, const Capture& capture) {
+  Appender appender(out);
+  std::string_view before = "{\"key\":";
+  std::string name;
+  for (const Record& record : capture.records) {
+    appender.text(before);
+    before = "]},{\"key\":";
+    appender.number(record.key);
+    // Statistics have plain names; the labels of a snapshot's fields come from the device.
+    if (capture.kind == Kind::kSnapshot) {
+      name.clear();
+      appendJson(name, record.name);
+      appender.text(",\"name\":");
+      appender.text(name);
+    } else {
+      appender.text(",\"name\":\"");
+      appender.text(record.name.empty() ? recordName(record) : record.name);
+      appender.text("\"");
+    }
+    std::string_view beforeValue = ",\"values\":[";
+    const uint64_t* values = capture.valuesOf(record);
+    for (size_t i = 0; i < record.valueCount; ++i) {
+      appender.text(beforeValue);
+      beforeValue = ",";
+      appender.number(values[i]);
+    }
+  }
+  if (!capture.records.empty()) appender.text("]}");
+}
+
+}  // namespace
+
 void renderJson(std::string& out, const Capture& capture) {
   out += "{\"source\":";
   appendJson(out, capture.source);
   out.append(",\"kind\":\"").append(kindName(capture.kind)).append("\",\"bytes\":");
   appendNumber(out, capture.bytes);
   out += ",\"records\":[";
-  for (const Record& record : capture.records) {
-    if (&record != capture.records.data()) out += ',';
-    out += "{\"key\":";
-    appendNumber(out, record.key);
-    out += ",\"name\":";
-    appendJson(out, record.name.empty() ? recordName(record) : record.name);
-    out += ",\"values\":[";
-    const uint64_t* values = capture.valuesOf(record);
-    for (size_t i = 0; i < record.valueCount; ++i) {
-      if (i != 0) out += ',';
-      appendNumber(out, values[i]);
-    }
-    out += "]}";
-  }
+  renderJsonRecords(out, capture);
   out += "],";
   renderJsonFindings(out, "findings", capture);
   out += "}\n";
@@ -134,40 +156,59 @@ void renderCsv(std::string& out, const Capture& capture) {
   std::string head;
   appendCsv(head, capture.source);
   head.append(",").append(kindName(capture.kind)).append(",");
+  Appender appender(out);
+  std::string name;
   for (const Record& record : capture.records) {
+    name.clear();
+    appendCsv(name, record.name.empty() ? recordName(record) : record.name);
     const uint64_t* values = capture.valuesOf(record);
     for (size_t i = 0; i < record.valueCount; ++i) {
-      out += head;
-      appendNumber(out, record.key);
-      out += ',';
-      appendCsv(out, record.name.empty() ? recordName(record) : record.name);
-      out += ',';
-      if (record.isArray) appendNumber(out, i);
-      out += ',';
-      appendNumber(out, values[i]);
-      out += '\n';
+      appender.text(head);
+      appender.number(record.key);
+      appender.text(",");
+      appender.text(name);
+      appender.text(",");
+      if (record.isArray) appender.number(i);
+      appender.text(",");
+      appender.number(values[i]);
+      appender.text("\n");
     }
   }
 }
 
 namespace {
 
+/// Words that the linters of metric names take for a unit, a type or a suffix with a meaning of its own.
+constexpr std::string_view kReservedWords[] = {
+    "b",  "bits",      "bucket", "count", "counter", "created", "d",     "days",    "gauge", "gb",
+    "h",  "histogram", "hours",  "info",  "kb",      "m",       "mb",    "minutes", "ms",    "ns",
+    "pb", "s",         "sec",    "sum",   "summary", "tb",      "total", "us",      "weeks"};
+
 /// A statistic's name in the alphabet and the style of metric names: hostWriteLogHisto becomes
-/// host_write_log_histo.
+/// host_write_log_histo. A reserved word is joined to the one before it: powerOnHours becomes power_onhours.
 std::string snakeCase(std::string_view name) {
   const auto is = [&](size_t i, int (*kind)(int)) {
     return i < name.size() && kind(static_cast<unsigned char>(name[i])) != 0;
   };
   std::string snake;
+  std::string word;
+  const auto endWord = [&] {
+    const bool isReserved =
+        std::find(std::begin(kReservedWords), std::end(kReservedWords), word) != std::end(kReservedWords);
+    if (snake.empty()) {
+      snake = isReserved ? word + "value" : word;
+    } else if (!word.empty()) {
+      snake.append(isReserved ? "" : "_").append(word);
+    }
+    word.clear();
+  };
   for (size_t i = 0; i < name.size(); ++i) {
     const bool startsWord =
         is(i, std::isupper) && i > 0 && (!is(i - 1, std::isupper) || is(i + 1, std::islower));
-    const char c =
-        is(i, std::isalnum) ? static_cast<char>(std::tolower(static_cast<unsigned char>(name[i]))) : '_';
-    if ((startsWord || c == '_') && !snake.ends_with('_') && !snake.empty()) snake += '_';
-    if (c != '_') snake += c;
+    if (startsWord || !is(i, std::isalnum)) endWord();
+    if (is(i, std::isalnum)) word += static_cast<char>(std::tolower(static_cast<unsigned char>(name[i])));
   }
-  while (snake.ends_with('_')) snake.pop_back();
+  endWord();
   return snake;
 }
 
@@ -209,11 +250,13 @@ bool OpenMetrics::add(std::string_view kind, std::string_view name, std::string_
 }
 
 void OpenMetrics::add(Capture& capture) {
+  // The summary's fields are statistics of that name.
+  const std::string_view kind = kindName(capture.kind == Kind::kSummary ? Kind::kStats : capture.kind);
   for (const Record& record : capture.records) {
     const std::string_view name = record.name.empty() ? "undefined" : record.name;
     bool isFirst = true;
     for (size_t i = 0; i < record.valueCount; ++i) {
-      isFirst &= add(kindName(capture.kind), name, "", capture.source, record.key,
+      isFirst &= add(kind, name, "", capture.source, record.key,
                      record.isArray ? static_cast<int64_t>(i) : -1, capture.valuesOf(record)[i]);
     }
     if (!isFirst) {

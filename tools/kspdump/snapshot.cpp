@@ -10,6 +10,7 @@
 #include "snapshot/legend.h"
 #include "snapshot/record_layout.h"
 #include "snapshot/triples.h"
+#include "tools/kspdump/text.h"
 
 namespace kspdump {
 
@@ -158,7 +159,7 @@ void findSnapshotFaults(Capture& capture, Bytes records, Bytes header) {
   if (header.empty()) {
     const uint64_t left = records.size() % ksp::kRecordBytes;
     if (left != 0) {
-      capture.find(records.size() - left, to_string(left) + " bytes left over, fewer than a record");
+      capture.find(records.size() - left, counted(left, "byte") + " left over, fewer than a record");
     }
     return;
   }
@@ -181,9 +182,9 @@ void findSnapshotFaults(Capture& capture, Bytes records, Bytes header) {
   const uint64_t announced = uint64_t{reader.recordSize()} * reader.recordCount();
   if (announced != records.size()) {
     capture.find(std::min<uint64_t>(announced, records.size()),
-                 "the header counts " + to_string(reader.recordCount()) + " records of " +
-                     to_string(reader.recordSize()) + " bytes, the capture holds " +
-                     to_string(records.size()) + " bytes");
+                 "the header counts " + counted(reader.recordCount(), "record") + " of " +
+                     counted(reader.recordSize(), "byte") + ", the capture holds " +
+                     counted(records.size(), "byte"));
   }
 }
 

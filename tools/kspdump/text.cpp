@@ -20,6 +20,10 @@ void appendNumber(std::string& out, Wide number) {
   out.append(first, digits + sizeof digits);
 }
 
+std::string counted(uint64_t count, const char* noun) {
+  return std::to_string(count) + " " + noun + (count == 1 ? "" : "s");
+}
+
 void appendJson(std::string& out, std::string_view text) {
   const bool plain = std::all_of(text.begin(), text.end(),
                                  [](char c) { return c >= ' ' && c < 0x7F && c != '"' && c != '\\'; });

@@ -1,13 +1,52 @@
 #pragma once
 
+#include <algorithm>
 #include <charconv>
 #include <concepts>
+#include <cstddef>
+#include <iterator>
 #include <string>
 #include <string_view>
 
 #include "tools/kspdump/capture.h"
 
 namespace kspdump {
+
+/// Appends small pieces by way of a buffer; what it holds is appended at the end of its life.
+class Appender {
+ public:
+  explicit Appender(std::string& out) : out_(out) {}
+  Appender(const Appender&) = delete;
+  Appender& operator=(const Appender&) = delete;
+  ~Appender() { flush(); }
+
+  void text(std::string_view piece) {
+    if (piece.size() > static_cast<size_t>(std::end(buffer_) - at_)) {
+      flush();
+      if (piece.size() > sizeof buffer_) {
+        out_ += piece;
+        return;
+      }
+    }
+    at_ = std::copy(piece.begin(), piece.end(), at_);
+  }
+
+  void number(uint64_t number) {
+    constexpr std::ptrdiff_t kMostDigits = 20;
+    if (std::end(buffer_) - at_ < kMostDigits) flush();
+    at_ = std::to_chars(at_, std::end(buffer_), number).ptr;
+  }
+
+ private:
+  void flush() {
+    out_.append(buffer_, at_);
+    at_ = buffer_;
+  }
+
+  std::string& out_;
+  char buffer_[4096];
+  char* at_ = buffer_;
+};
 
 /// Appends a number in decimal.
 template <std::integral Number>
@@ -16,6 +55,9 @@ void appendNumber(std::string& out, Number number) {
   out.append(digits, std::to_chars(digits, digits + sizeof digits, number).ptr);
 }
 void appendNumber(std::string& out, Wide number);
+
+/// "1 byte", "2 bytes".
+std::string counted(uint64_t count, const char* noun);
 
 /// Appends a text as a JSON string; bytes that are not UTF-8 are replaced.
 void appendJson(std::string& out, std::string_view text);

@@ -1,0 +1,315 @@
+// The real kspdump on captures: what it prints, what it names, how it ends.
+
+#include <gtest/gtest.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <nlohmann/json.hpp>
+#include <regex>
+#include <sstream>
+
+namespace {
+
+namespace fs = std::filesystem;
+using nlohmann::json;
+
+std::string readAll(const fs::path& file) {
+  std::ifstream stream(file, std::ios::binary);
+  return {std::istreambuf_iterator<char>(stream), {}};
+}
+
+template <unsigned width>
+std::string numbers(std::initializer_list<uint64_t> values) {
+  std::string bytes;
+  for (const uint64_t value : values) {
+    for (unsigned i = 0; i < width; ++i) bytes += static_cast<char>(value >> (8 * i));
+  }
+  return bytes;
+}
+
+std::string record(uint32_t key, std::initializer_list<uint64_t> values) {
+  return numbers<4>({key, values.size()}) + numbers<8>(values);
+}
+
+std::string media(uint16_t key, const std::string& value) {
+  return numbers<2>({key, value.size()}) + value;
+}
+
+struct Outcome {
+  int status;
+  std::string out;
+  std::string err;
+};
+
+class Kspdump : public testing::Test {
+ protected:
+  Kspdump() : folder_(fs::path(testing::TempDir()) / ("kspdump" + std::to_string(getpid()))) {
+    fs::create_directories(folder_);
+  }
+  ~Kspdump() override { fs::remove_all(folder_); }
+
+  void write(const std::string& name, const std::string& bytes) const {
+    std::ofstream(folder_ / name, std::ios::binary) << bytes;
+  }
+
+  /// Runs a shell command in which KSPDUMP is the program.
+  Outcome shell(const std::string& command) const {
+    const std::string line = "cd '" + folder_.string() + "' && { " + command + "; } >.out 2>.err";
+    const int status = std::system(("KSPDUMP=" KSP_KSPDUMP "; " + line).c_str());
+    return {WIFEXITED(status) ? WEXITSTATUS(status) : -1, readAll(folder_ / ".out"),
+            readAll(folder_ / ".err")};
+  }
+
+  Outcome run(const std::string& arguments) const { return shell("$KSPDUMP " + arguments); }
+
+  const fs::path folder_;
+};
+
+/// hostWrites twice, perHostReads (an array of 2) and an unknown key; then an end marker with rubbish behind.
+const std::string kStats = record(4, {18446744073709551615U}) + record(298, {7, 9}) + record(900, {1}) +
+                           record(4, {5}) + record(0xFFFF, {1}) + "rubbish";
+
+TEST_F(Kspdump, JsonKeepsEveryRecordInOrderAndExact) {
+  write("a \"b\".stats", kStats);
+  const Outcome result = run("stats --format json 'a \"b\".stats'");
+  EXPECT_EQ(result.status, 0) << result.err;
+  EXPECT_EQ(json::parse(result.out),
+            json::parse(R"({"source":"a \"b\".stats","kind":"stats","bytes":95,"findings":[],"records":[
+              {"key":4,"name":"hostWrites","values":[18446744073709551615]},
+              {"key":298,"name":"perHostReads","values":[7,9]},
+              {"key":900,"name":"Stat_900","values":[1]},
+              {"key":4,"name":"hostWrites","values":[5]}]})"));
+  EXPECT_EQ(std::count(result.out.begin(), result.out.end(), '\n'), 1);
+
+  write("n.stats", record(298, {7, 9}));
+  EXPECT_EQ(json::parse(run("stats --numbers --format json n.stats").out)["records"],
+            json::parse(R"([{"key":298,"name":"Stat_298","values":[7,9]}])"));
+}
+
+TEST_F(Kspdump, TablesShowArraysAsSumAndPicture) {
+  write("a.stats", kStats);
+  write("h.stats", record(14, {0, 1, 2, 3, 4, 5, 6, 7, 8, 0}) + record(4, {12}));
+  const std::string head =
+      "h.stats: statistics, 104 bytes, 2 records\n"
+      "  KEY  NAME               VALUE  ELEMENTS (VALUE IS THEIR SUM)\n"
+      "   14  hostWriteLogHisto     36  ";
+  const std::string tail = "\n    4  hostWrites            12\n";
+  EXPECT_EQ(shell("LC_ALL=C $KSPDUMP stats h.stats").out, head + "_.:-=+*#@_" + tail);
+  EXPECT_EQ(shell("LC_ALL=C.UTF-8 $KSPDUMP stats h.stats").out, head + "·▁▂▃▄▅▆▇█·" + tail);
+  EXPECT_EQ(run("stats --match '*Reads' a.stats").out.substr(0, 55),
+            "a.stats: statistics, 95 bytes, 4 records, 1 shown\n  KEY");
+}
+
+TEST_F(Kspdump, CsvHasARowAValue) {
+  write("a,b.stats", record(4, {12}) + record(298, {7, 9}));
+  EXPECT_EQ(run("stats --format csv a,b.stats").out,
+            "source,kind,key,name,element,value\n"
+            "\"a,b.stats\",stats,4,hostWrites,,12\n"
+            "\"a,b.stats\",stats,298,perHostReads,0,7\n"
+            "\"a,b.stats\",stats,298,perHostReads,1,9\n");
+}
+
+TEST_F(Kspdump, OpenMetricsHasEveryMetricOnce) {
+  write("a.media", media(8212, numbers<4>({1, 2, 3, 4})) + media(4096, numbers<4>({5})));
+  write("b\\.media", media(8220, numbers<4>({1, 2, 3, 4, 5, 6, 7})) + media(4096, numbers<4>({6})) +
+                         media(4096, numbers<4>({7})));
+  const Outcome result = run("media --format openmetrics --match '*Tmode*' a.media 'b\\.media'");
+  EXPECT_EQ(result.out,
+            "# HELP ksp_media_pass_with_tmode_hard The controller's passWithTmodeHard.\n"
+            "# TYPE ksp_media_pass_with_tmode_hard gauge\n"
+            "ksp_media_pass_with_tmode_hard{source=\"a.media\",key=\"4096\"} 5\n"
+            "ksp_media_pass_with_tmode_hard{source=\"b\\\\.media\",key=\"4096\"} 7\n"
+            "# EOF\n");
+  EXPECT_EQ(result.err,
+            "kspdump: b\\.media: offset 40: passWithTmodeHard(4096) comes again; its last record stands\n");
+  EXPECT_EQ(result.status, 1);
+}
+
+TEST_F(Kspdump, FindingsNameOffsetAndReason) {
+  const std::string sound = record(4, {12});
+  const std::string value = numbers<4>({5});
+  const struct {
+    const char* command;
+    std::string bytes;
+    std::string finding;
+    size_t records;
+  } cases[] = {
+      {"stats", "", "offset 0: the capture is empty", 0},
+      {"stats", sound + "abc", "offset 16: 3 bytes left over, fewer than a word", 1},
+      {"stats", sound + numbers<4>({5, 3}) + sound,
+       "offset 16: key 5 announces 3 values, but the capture ends after 2", 1},
+      {"stats", sound + numbers<4>({0x30000001, 1}) + sound,
+       "offset 16: key 805306369 is invalid, so the rest cannot be read", 1},
+      {"stats", sound + record(14, {1, 2}),
+       "offset 16: hostWriteLogHisto(14) carries 2 values, 10 configured", 2},
+      {"stats", sound + numbers<4>({5, 0}), "offset 16: hostWritesDyn(5) carries 0 values, 1 configured", 1},
+      {"stats", std::string(64, '\0'),
+       "offset 0: there is no known statistic in it: is it a statistics capture?", 0},
+      {"summary", sound + numbers<4>({5, 3}),
+       "offset 16: key 5 announces 3 values, but the capture ends after 0", 18},
+      {"media", media(4096, value) + "abc", "offset 8: 3 bytes left over, fewer than a record's header", 1},
+      {"media", media(4096, value) + numbers<2>({4097, 4}),
+       "offset 8: key 4097 announces 4 bytes, but the capture ends after 0", 1},
+      {"media", media(4096, value + "a"), "offset 0: passWithTmodeHard(4096) carries 5 bytes, 4 configured",
+       1},
+      {"media", media(4096, value.substr(1)),
+       "offset 0: passWithTmodeHard(4096) carries 3 bytes, 4 configured", 0},
+      {"media", media(9, value),
+       "offset 0: there is no known statistic in it: is it a media statistics capture?", 0},
+      {"snapshot", std::string(253, '\1'), "offset 252: 1 byte left over, fewer than a record", 26},
+  };
+  for (const auto& [command, bytes, finding, records] : cases) {
+    write("x", bytes);
+    const Outcome result = run(std::string(command) + " --format json x");
+    EXPECT_EQ(result.status, 1);
+    EXPECT_EQ(result.err, "kspdump: x: " + finding + "\n");
+    const json document = json::parse(result.out);
+    EXPECT_EQ(document["records"].size(), records) << finding;
+    ASSERT_EQ(document["findings"].size(), 1u);
+    EXPECT_EQ("offset " + document["findings"][0]["offset"].dump() + ": " +
+                  document["findings"][0]["reason"].get<std::string>(),
+              finding);
+  }
+}
+
+TEST_F(Kspdump, ManyFilesComeOutInOrderWhateverTheJobs) {
+  std::string files;
+  for (int i = 0; i < 60; ++i) {
+    const std::string name = "f" + std::to_string(i);
+    std::string bytes;
+    for (int k = 0; k < (i % 7) * 400; ++k) bytes += record(4, {static_cast<uint64_t>(i)});
+    write(name, bytes + record(5, {1}));
+    files += " " + name + (i == 30 ? " missing ." : "");
+  }
+  const Outcome alone = run("stats --format json --jobs 1" + files);
+  const Outcome together = run("stats --format json --jobs 8" + files);
+  EXPECT_EQ(alone.status, 3);
+  EXPECT_EQ(alone.err,
+            "kspdump: missing: cannot be read: No such file or directory\n"
+            "kspdump: .: cannot be read: Is a directory\n");
+  EXPECT_EQ(together.out, alone.out);
+  EXPECT_EQ(together.err, alone.err);
+  std::istringstream lines(alone.out);
+  int next = 0;
+  for (std::string line; std::getline(lines, line); ++next) {
+    EXPECT_EQ(json::parse(line)["source"], "f" + std::to_string(next));
+  }
+  EXPECT_EQ(next, 60);
+}
+
+TEST_F(Kspdump, TheFixedSnapshotIsTheLibrarysReport) {
+  const std::string data = KSP_TEST_DATA "/snapshot/report_example";
+  EXPECT_EQ(run("snapshot " + data + ".records").out, readAll(data + ".txt"));
+  // More records than are rendered at a time.
+  const std::string one = readAll(data + ".records").substr(0, 252);
+  std::string many;
+  for (int i = 0; i < 5000; ++i) many += one;
+  write("many", many);
+  const std::string report = run("snapshot - < many").out;
+  const std::string line = report.substr(1337, report.find('\n', 1337) - 1336);
+  ASSERT_EQ(report.size(), 1337 + 5000 * line.size() + 1);
+  for (size_t i = 0; i < 5000; ++i)
+    ASSERT_EQ(report.compare(1337 + i * line.size(), line.size(), line), 0) << i;
+}
+
+TEST_F(Kspdump, AHeadersSnapshotLosesNoLineAtTheEndOfAPage) {
+  // One descriptor whose line is 900 characters wide: some thousand lines need several pages.
+  const std::string format = "%900u";
+  write("h", numbers<4>({0, 6, 4, 3001, 0, 0, 40, 0, 0}) + std::string("New\0", 4) +
+                 numbers<4>({1, 0, 0, 0, 4}) + format + std::string(16 - format.size(), '\0'));
+  std::string records;
+  for (uint64_t i = 1; i <= 3001; ++i) records += numbers<4>({i % 10 == 0 ? 0 : i});
+  write("r", records);
+  const Outcome result = run("snapshot --header h r");
+  EXPECT_EQ(result.status, 0) << result.err;
+  std::istringstream lines(result.out);
+  uint64_t expected = 1;
+  int captures = 0;
+  for (std::string line; std::getline(lines, line);) {
+    if (line.size() == 900) {
+      EXPECT_EQ(std::stoull(line), expected);
+      expected += expected % 10 == 9 ? 2 : 1;
+    } else if (line.starts_with("Captured at: ")) {
+      ++captures;
+    }
+  }
+  EXPECT_EQ(expected, 3001u);
+  EXPECT_GT(captures, 5);
+  EXPECT_EQ(json::parse(run("snapshot --header h --format json r").out)["records"][8],
+            json::parse(R"({"key":8,"name":"field0","values":[9]})"));
+
+  write("h", "short");
+  EXPECT_EQ(run("snapshot --header h r").err, "kspdump: h: the header is shorter than its fixed 36 bytes\n");
+  EXPECT_EQ(run("snapshot --header h r").status, 3);
+}
+
+TEST_F(Kspdump, DiffTellsWhatChanged) {
+  write("old", record(4, {18446744073709551615U}) + record(298, {7, 9}) + record(5, {1}) + record(5, {2}));
+  write("new", record(5, {1}) + record(5, {3}) + record(4, {0}) + record(298, {7, 10}) + record(900, {4}));
+  EXPECT_EQ(json::parse(run("diff stats --format json old new").out)["changes"],
+            json::parse(R"([{"key":5,"name":"hostWritesDyn","old":[2],"new":[3],"delta":[1]},
+              {"key":4,"name":"hostWrites","old":[18446744073709551615],"new":[0],"delta":[-18446744073709551615]},
+              {"key":298,"name":"perHostReads","old":[7,9],"new":[7,10],"delta":[0,1]},
+              {"key":900,"name":"Stat_900","old":[null],"new":[4],"delta":[null]}])"));
+  EXPECT_EQ(run("diff stats --match 'hostW*s' --format csv old new").out,
+            "source,kind,key,name,element,old,new,delta\n"
+            "new,stats,4,hostWrites,,18446744073709551615,0,-18446744073709551615\n");
+  EXPECT_EQ(shell("LC_ALL=C $KSPDUMP diff stats --match 'perHost*' old new").out,
+            "old -> new: 1 changed\n"
+            "KEY  NAME          OLD  NEW  DELTA  ELEMENTS' CHANGES\n"
+            "298  perHostReads   16   17     +1  _@\n");
+  EXPECT_EQ(run("diff media old new").status, 1);
+  EXPECT_EQ(run("diff stats old").status, 2);
+}
+
+TEST_F(Kspdump, OutputIsWholeOrNotThere) {
+  write("a.stats", kStats);
+  write("out", "before");
+  EXPECT_EQ(run("stats --format csv --output out a.stats").status, 0);
+  EXPECT_EQ(readAll(folder_ / "out").substr(0, 7), "source,");
+  const Outcome none = run("stats --output no/such/out a.stats");
+  EXPECT_EQ(none.status, 3);
+  EXPECT_EQ(none.err, "kspdump: no/such/out cannot be opened: No such file or directory\n");
+  EXPECT_EQ(run("stats --output /dev/full a.stats").err,
+            "kspdump: /dev/full cannot be written: No space left on device\n");
+  EXPECT_EQ(std::distance(fs::directory_iterator(folder_), {}), 4) << "nothing unfinished is left";
+  const Outcome broken =
+      shell("yes a.stats | head -n 5000 | xargs $KSPDUMP stats --format csv | head -n 1; test ${PIPESTATUS[2]} != 3");
+  EXPECT_EQ(broken.err, "");
+}
+
+TEST_F(Kspdump, WrongUsageEndsWithTwo) {
+  for (const char* arguments :
+       {"", "stats", "stats --format xml x", "snapshot a b", "stats --jobs 0 x", "nonsense"}) {
+    const Outcome result = run(arguments);
+    EXPECT_EQ(result.status, 2) << arguments;
+    EXPECT_NE(result.err, "") << arguments;
+  }
+  EXPECT_EQ(run("--version").out, "kspdump " KSP_VERSION "\n");
+  EXPECT_EQ(run("stats --help").status, 0);
+}
+
+TEST_F(Kspdump, NamesCannotSteerTheTerminal) {
+  write("a\x1b[2J\n.stats", "");
+  EXPECT_EQ(run("stats a*").err, "kspdump: a\\x1b[2J\\x0a.stats: offset 0: the capture is empty\n");
+}
+
+TEST_F(Kspdump, ExamplesAreWhatTheirGeneratorMakes) {
+  ASSERT_EQ(shell(KSP_CAPTURE_GENERATOR " .").status, 0);
+  int examples = 0;
+  for (const auto& file : fs::directory_iterator(KSP_EXAMPLE_CAPTURES)) {
+    if (file.path().extension() == ".cpp") continue;
+    EXPECT_EQ(readAll(folder_ / file.path().filename()), readAll(file)) << file;
+    ++examples;
+  }
+  EXPECT_EQ(examples, 6);
+  const Outcome all = run("stats monday.stats tuesday.stats");
+  EXPECT_EQ(all.status, 0) << all.err;
+  EXPECT_EQ(run("media monday.media tuesday.media").status, 0);
+  EXPECT_EQ(run("snapshot --header day.header day.snapshot").status, 0);
+}
+
+}  // namespace
