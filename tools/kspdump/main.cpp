@@ -285,13 +285,12 @@ class CommandLine {
 }  // namespace
 
 int main(int argc, char** argv) {
-  std::setlocale(LC_CTYPE, "");
-  Options options;
-  CommandLine commandLine(options);
-  const int ended = commandLine.parse(argc, argv);
-  if (ended >= 0) return ended;
   try {
-    return run(options);
+    std::setlocale(LC_CTYPE, "");
+    Options options;
+    CommandLine commandLine(options);
+    const int ended = commandLine.parse(argc, argv);
+    return ended >= 0 ? ended : run(options);
   } catch (const std::bad_alloc&) {
     std::fputs("kspdump: out of memory\n", stderr);
   } catch (const std::exception& error) {
