@@ -32,8 +32,8 @@ struct Elements {
   }
 };
 
-/// The pieces that texts are made of. Each is written at `at`, cut at `end`, and returns where it ends; `end`
-/// is the place of a text's 99th character, so that one more character may be written.
+// What names are made of. Each `writePiece` writes a piece at `at`, where all is zero, cuts it at `end`, and
+// returns where it ends.
 
 inline char* writePiece(char* at, const char* end, std::string_view piece) {
   const size_t size = std::min(piece.size(), static_cast<size_t>(end - at));
@@ -94,8 +94,8 @@ class Index {
 
 /// Returns a node whose text is all zeros, or null.
 ///
-/// Cheaper than memory that comes zeroed: the stores are the compiler's own, in halves small enough for it
-/// not to call or loop.
+/// This costs less than memory that comes zeroed: of half a text the compiler makes a few stores in place,
+/// while calloc, and the whole of it at once, would end in a call or a loop.
 [[gnu::always_inline]] inline NameValueNode* allocateNode(uint64_t value) {
   auto* const node = static_cast<NameValueNode*>(std::malloc(sizeof(NameValueNode)));
   if (node == nullptr) return nullptr;
