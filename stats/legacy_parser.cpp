@@ -59,7 +59,7 @@ void addSingle(KSPParseContext& context, const StatsKey& key, uint64_t value) {
       context.*field->whole = value;
     }
   }
-  AddSingleValueToKSPContext(context, "", key.name, value);
+  AddSingleValueToKSPContext(context, key.name, value);
 }
 
 }  // namespace
