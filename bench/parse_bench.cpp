@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <cstdio>
 #include <cstdlib>
+#include <iostream>
 #include <iterator>
 #include <string>
 #include <vector>
@@ -80,8 +81,9 @@ void plainAppend(GenericParserContext& context, const char* prefix, const char* 
   NameValueNode* const nameNode = newNode<nodes>();
   if (valueNode == nullptr || nameNode == nullptr) std::abort();
   nameNode->next = valueNode->next = nullptr;
-  std::snprintf(nameNode->text, sizeof nameNode->text - 1, "%s%s", prefix, name);
-  std::snprintf(valueNode->text, sizeof valueNode->text - 1, "%llu", static_cast<unsigned long long>(value));
+  static_cast<void>(std::snprintf(nameNode->text, sizeof nameNode->text - 1, "%s%s", prefix, name));
+  static_cast<void>(std::snprintf(valueNode->text, sizeof valueNode->text - 1, "%llu",
+                                  static_cast<unsigned long long>(value)));
   nameNode->text[sizeof nameNode->text - 1] = valueNode->text[sizeof valueNode->text - 1] = '\0';
   valueNode->value = value;
   link(context, nameNode, valueNode);
@@ -92,7 +94,7 @@ void plainAppend(GenericParserContext& context, const char* name, const ksp::Ele
   if (elements.count == 1) return plainAppend<nodes>(context, "", name, elements[0]);
   for (uint32_t i = 0; i < elements.count; ++i) {
     char index[16];
-    std::snprintf(index, sizeof index, "%d", static_cast<int>(i));
+    static_cast<void>(std::snprintf(index, sizeof index, "%d", static_cast<int>(i)));
     plainAppend<nodes>(context, name, index, elements[i]);
   }
 }
@@ -103,7 +105,7 @@ void plainGeneric(GenericParserContext* context, const void* stream, uint32_t le
     const ksp::StatsKey* const key = ksp::findStatsKey(record.key);
     if (key == nullptr) continue;
     char name[KSPNodeTextSize];
-    std::snprintf(name, sizeof name, key->isArray() ? "%s_" : "%s", key->name.data());
+    static_cast<void>(std::snprintf(name, sizeof name, key->isArray() ? "%s_" : "%s", key->name.data()));
     plainAppend<Nodes::kZeroed>(*context, name, record.elements(key->count));
   }
 }
@@ -164,7 +166,7 @@ void group(const std::string& name, const Bytes& stream, Library library, Plain 
   });
   const auto entries = std::ranges::distance(ksp::entries(expected));
   if (!same || entries == 0) {
-    std::fprintf(stderr, "%s: the library and the plain yardstick differ\n", name.c_str());
+    std::cerr << name << ": the library and the plain yardstick differ\n";
     std::exit(1);
   }
   benchmark::RegisterBenchmark((name + "/library").c_str(), [=](benchmark::State& state) {

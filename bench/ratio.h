@@ -53,6 +53,7 @@ inline int runWithRatios(int argc, char** argv, std::span<const Ratio> ratios) {
                                   "--benchmark_enable_random_interleaving=true"};
   own.insert(own.end(), argv + 1, argv + argc);
   std::vector<char*> arguments;
+  arguments.reserve(own.size());
   for (std::string& argument : own) arguments.push_back(argument.data());
   int count = static_cast<int>(arguments.size());
   benchmark::Initialize(&count, arguments.data());

@@ -1,6 +1,7 @@
 #pragma once
 
 #include <algorithm>
+#include <bit>
 #include <cstddef>
 #include <cstdint>
 #include <cstdlib>
@@ -32,8 +33,8 @@ struct Elements {
   }
 };
 
-/// The pieces that texts are made of. Each is written at `at`, cut at `end`, and returns where it ends; `end`
-/// is the place of a text's 99th character, so that one more character may be written.
+// What names are made of. Each `writePiece` writes a piece at `at`, where all is zero, cuts it at `end`, and
+// returns where it ends.
 
 inline char* writePiece(char* at, const char* end, std::string_view piece) {
   const size_t size = std::min(piece.size(), static_cast<size_t>(end - at));
@@ -63,11 +64,8 @@ class Index {
     if (text_ >> lastDigit != '9') {
       text_ += uint64_t{1} << lastDigit;
     } else {
-      // A carry; every tenth step.
-      const uint64_t digits = decimal::eightDigits(value_);
-      const unsigned zeros = decimal::leadingZeros(digits);
-      text_ = (digits | decimal::kZeros) >> 8 * zeros;
-      size_ = 8 - zeros;
+      text_ = afresh(value_);  // every tenth step
+      size_ = (71 - static_cast<unsigned>(std::countl_zero(text_))) / 8;
     }
   }
   [[nodiscard]] uint32_t value() const { return value_; }
@@ -83,6 +81,12 @@ class Index {
   }
 
  private:
+  // Not inlined, as the compiler would carry its intermediate products through the whole loop.
+  [[gnu::noinline]] static uint64_t afresh(uint32_t value) {
+    const uint64_t digits = decimal::eightDigits(value);
+    return (digits | decimal::kZeros) >> 8 * decimal::leadingZeros(digits);
+  }
+
   uint64_t text_ = '0';  // the first digit in the lowest byte
   unsigned size_ = 1;
   uint32_t value_ = 0;
@@ -94,14 +98,14 @@ class Index {
 
 /// Returns a node whose text is all zeros, or null.
 ///
-/// Cheaper than memory that comes zeroed: the stores are the compiler's own, in halves small enough for it
-/// not to call or loop.
+/// This costs less than memory that comes zeroed: of half a text the compiler makes a few stores in place,
+/// while calloc, and the whole of it at once, would end in a call or a loop.
 [[gnu::always_inline]] inline NameValueNode* allocateNode(uint64_t value) {
   auto* const node = static_cast<NameValueNode*>(std::malloc(sizeof(NameValueNode)));
   if (node == nullptr) return nullptr;
-  constexpr size_t kHalf = KSPNodeTextSize / 2;
-  std::memset(node->text, 0, kHalf);
-  std::memset(node->text + kHalf, 0, kHalf);
+  constexpr size_t kHalf = 48;
+  std::memset(node, 0, kHalf);
+  std::memset(node->text + kHalf, 0, offsetof(NameValueNode, value) - kHalf);
   node->value = value;
   node->next = nullptr;
   return node;
@@ -179,9 +183,8 @@ bool appendElements(GenericParserContext* context, Elements elements, const Piec
 }
 
 /// Appends one entry to a legacy context; without memory for it, nothing.
-inline void AddSingleValueToKSPContext(KSPParseContext& context, std::string_view prefix, const KeyName& name,
-                                       uint64_t value) {
-  appendEntry(&context.entries, value, prefix, name);
+inline void AddSingleValueToKSPContext(KSPParseContext& context, const KeyName& name, uint64_t value) {
+  appendEntry(&context.entries, value, name);
 }
 
 }  // namespace ksp

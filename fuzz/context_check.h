@@ -28,7 +28,7 @@ inline uint32_t requireSound(const GenericParserContext& context) {
   const NameValueNode* lastValue = nullptr;
   const NameValueNode* value = context.valueHead;
   for (const NameValueNode* name = context.nameHead; name != nullptr; name = name->next) {
-    require(value != nullptr && name->text[0] != '\0');
+    require(value != nullptr && name->value == 0);
     requireText(*name);
     requireText(*value);
     require(value->text == std::to_string(value->value));

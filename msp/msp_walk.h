@@ -4,6 +4,7 @@
 #include <cstdint>
 
 #include "context/little_endian.h"
+#include "context/record_cursor.h"
 
 namespace ksp {
 
@@ -29,53 +30,38 @@ struct MSPRecord {
   [[nodiscard]] bool isFiller() const { return key == kMSPKeySkip; }
 };
 
-/// Cursor over the records of a media statistics stream; hands out only what lies within it.
-class MSPWalk {
- public:
-  enum class End {
-    kNotReached,
-    /// Right behind the last record.
-    kComplete,
-    /// Behind the last record, with fewer bytes left than a header has.
-    kTruncatedHeader,
-    kEndRecord,
-    /// The header announces more bytes than the stream has left.
-    kOverrun,
-  };
+/// Why a walk ended.
+enum class MSPEnd {
+  kNotReached,
+  /// Right behind the last record.
+  kComplete,
+  /// Behind the last record, with fewer bytes left than a header has.
+  kTruncatedHeader,
+  kEndRecord,
+  /// The header announces more bytes than the stream has left.
+  kOverrun,
+};
 
-  /// `stream` holds `length` bytes of any alignment and content; null is an empty stream.
-  MSPWalk(const void* stream, uint32_t length)
-      : begin_(static_cast<const unsigned char*>(stream)), size_(stream != nullptr ? length : 0) {}
+/// Cursor over the records of a media statistics stream; hands out only what lies within it.
+class MSPWalk : public RecordCursor<MSPEnd> {
+ public:
+  MSPWalk(const void* stream, uint32_t length) : RecordCursor(stream, length) {}
 
   /// Moves to the next record. When there is none, returns false: `end()` then tells why, and `record` holds
   /// the offset at which the walk ended and the key and length of the header that ended it, if one did.
   bool next(MSPRecord& record) {
-    record = {.offset = offset_, .key = 0, .length = 0, .value = nullptr};
-    size_t left = size_ - offset_;
-    if (left < kMSPHeaderSize) return stop(left == 0 ? End::kComplete : End::kTruncatedHeader);
-    left -= kMSPHeaderSize;
-    const unsigned char* const header = begin_ + offset_;
+    record = {.offset = offset(), .key = 0, .length = 0, .value = nullptr};
+    if (left() < kMSPHeaderSize) {
+      return stop(record.offset, left() == 0 ? MSPEnd::kComplete : MSPEnd::kTruncatedHeader);
+    }
+    const unsigned char* const header = take(kMSPHeaderSize);
     record.key = static_cast<uint16_t>(loadLittleEndian(header, 2));
     record.length = static_cast<uint16_t>(loadLittleEndian(header + 2, 2));
-    if (record.key == kMSPKeyEnd && !record.isEmpty()) return stop(End::kEndRecord);
-    if (record.length > left) return stop(End::kOverrun);
-    record.value = header + kMSPHeaderSize;
-    offset_ += kMSPHeaderSize + record.length;
+    if (record.key == kMSPKeyEnd && !record.isEmpty()) return stop(record.offset, MSPEnd::kEndRecord);
+    if (record.length > left()) return stop(record.offset, MSPEnd::kOverrun);
+    record.value = take(record.length);
     return true;
   }
-
-  [[nodiscard]] End end() const { return end_; }
-
- private:
-  bool stop(End end) {
-    end_ = end;
-    return false;
-  }
-
-  const unsigned char* begin_;
-  size_t size_;
-  size_t offset_ = 0;
-  End end_ = End::kNotReached;
 };
 
 }  // namespace ksp

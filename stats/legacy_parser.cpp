@@ -23,7 +23,7 @@ void AddMultipleFieldsToKSPContext(KSPParseContext& context, uint32_t key, const
 
 void addSingle(KSPParseContext& context, const StatsKey& key, uint64_t value) {
   if (const SummaryField* const field = findByKey<kSummaryFields>(key.key)) field->store(context, value);
-  AddSingleValueToKSPContext(context, "", key.name, value);
+  AddSingleValueToKSPContext(context, key.name, value);
 }
 
 }  // namespace

@@ -1,10 +1,12 @@
 #pragma once
 
+#include <algorithm>
 #include <cstddef>
 #include <cstdint>
 
 #include "context/append.h"
 #include "context/little_endian.h"
+#include "context/record_cursor.h"
 
 namespace ksp {
 
@@ -41,67 +43,53 @@ struct StatsRecord {
   }
 };
 
-/// Cursor over the records of a statistics stream; hands out only what lies within it.
-class StatsWalk {
- public:
-  enum class End {
-    kNotReached,
-    /// Right behind the last record.
-    kComplete,
-    /// Behind the last record, with fewer bytes left than a word has; they are ignored.
-    kTail,
-    kEndMarker,
-    /// The header's key is above the greatest.
-    kInvalidKey,
-    /// The header announces more values than the stream has left.
-    kOverrun,
-  };
+/// Why a walk ended.
+enum class StatsEnd {
+  kNotReached,
+  /// Right behind the last record.
+  kComplete,
+  /// Behind the last record, with fewer bytes left than a word has; they are ignored.
+  kTail,
+  kEndMarker,
+  /// The header's key is above the greatest.
+  kInvalidKey,
+  /// The header announces more values than the stream has left.
+  kOverrun,
+};
 
-  /// `stream` holds `length` bytes of any alignment and content; null is an empty stream.
+/// Cursor over the records of a statistics stream; hands out only what lies within it.
+class StatsWalk : public RecordCursor<StatsEnd> {
+ public:
   StatsWalk(const void* stream, uint32_t length, StatsFraming framing)
-      : begin_(static_cast<const unsigned char*>(stream)),
-        size_(stream != nullptr ? length : 0),
-        framing_(framing) {}
+      : RecordCursor(stream, length), framing_(framing) {}
 
   /// Moves to the next record. When there is none, returns false: `end()` then tells why, and `record` holds
   /// the offset at which the walk ended and the key and count of the header that ended it, if one did.
   bool next(StatsRecord& record) {
-    record = {.offset = offset_, .key = 0, .count = 0, .values = nullptr};
-    if (atEnd()) return stop(offset_ == size_ ? End::kComplete : End::kTail);
-    const unsigned char* const header = begin_ + offset_;
+    record = {.offset = offset(), .key = 0, .count = 0, .values = nullptr};
+    if (atEnd()) return stop(record.offset, left() == 0 ? StatsEnd::kComplete : StatsEnd::kTail);
+    const unsigned char* const header = take(kStatsWordSize);
     record.key = static_cast<uint32_t>(loadLittleEndian(header, 4));
     record.count = static_cast<uint32_t>(loadLittleEndian(header + 4, 4));
     if (framing_ == StatsFraming::kUnmarked || !record.isEmpty()) {
-      if (framing_ == StatsFraming::kMarked && record.key == kStatsEndMarker) return stop(End::kEndMarker);
-      if (record.key > kGreatestStatsKey) return stop(End::kInvalidKey);
-      if (record.count > words() - 1) return stop(End::kOverrun);
+      if (framing_ == StatsFraming::kMarked && record.key == kStatsEndMarker) {
+        return stop(record.offset, StatsEnd::kEndMarker);
+      }
+      if (record.key > kGreatestStatsKey) return stop(record.offset, StatsEnd::kInvalidKey);
+      if (record.count > left() / kStatsWordSize) return stop(record.offset, StatsEnd::kOverrun);
     }
-    record.values = header + kStatsWordSize;
-    offset_ += (size_t{1} + record.count) * kStatsWordSize;
+    record.values = take(size_t{record.count} * kStatsWordSize);
     return true;
   }
 
   /// Whether no whole word is left.
-  [[nodiscard]] bool atEnd() const { return words() == 0; }
-
-  [[nodiscard]] End end() const { return end_; }
+  [[nodiscard]] bool atEnd() const { return left() < kStatsWordSize; }
 
   /// Whether a bad header ended the walk.
-  [[nodiscard]] bool failed() const { return end_ == End::kInvalidKey || end_ == End::kOverrun; }
+  [[nodiscard]] bool failed() const { return end() == StatsEnd::kInvalidKey || end() == StatsEnd::kOverrun; }
 
  private:
-  [[nodiscard]] size_t words() const { return (size_ - offset_) / kStatsWordSize; }
-
-  bool stop(End end) {
-    end_ = end;
-    return false;
-  }
-
-  const unsigned char* begin_;
-  size_t size_;
-  size_t offset_ = 0;
   StatsFraming framing_;
-  End end_ = End::kNotReached;
 };
 
 }  // namespace ksp

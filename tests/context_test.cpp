@@ -3,7 +3,9 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <array>
 
+#include "fuzz/context_check.h"
 #include "ksp/numbers.h"
 #include "tests/streams.h"
 
@@ -11,55 +13,44 @@ namespace ksp::test {
 namespace {
 
 TEST(Context, NamesAreCutAt98Characters) {
-  const std::string longText(120, 'n');
-  const struct {
-    std::string prefix;
-    std::string name;
-  } cases[] = {{"", ""},        {"a", "b"},      {longText.substr(0, 60), longText.substr(0, 60)},
-               {longText, "x"}, {"x", longText}, {longText.substr(0, 98), "x"}};
-  GenericContext context;
-  Entries expected;
-  for (const auto& c : cases) {
-    EXPECT_EQ(AddSingleValueToGenericContext(context.get(), c.prefix.c_str(), c.name.c_str(), 7), 1);
-    expected.push_back({(c.prefix + c.name).substr(0, 98), 7});
-  }
   const unsigned char elements[12] = {};
-  for (const size_t length : {74U, 90U, 96U, 97U, 98U, 99U}) {
-    const std::string stem = longText.substr(0, length);
+  GenericContext context;
+  std::string expected;
+  const auto expect = [&](const std::string& name) { expected.append(" ").append(name, 0, 98).append("=0"); };
+  for (const size_t length : {1U, 74U, 90U, 96U, 97U, 98U, 99U, 120U}) {
+    const std::string stem(length, 'n');
+    EXPECT_EQ(AddSingleValueToGenericContext(context.get(), stem.c_str(), "", 0), 1);
+    EXPECT_EQ(AddSingleValueToGenericContext(context.get(), "pre", stem.c_str(), 0), 1);
     EXPECT_EQ(AddMultipleFieldsToGenericContext(context.get(), stem.c_str(), elements, 1, 12), 1);
-    for (int i = 0; i < 12; ++i) expected.push_back({(stem + std::to_string(i)).substr(0, 98), 0});
+    expect(stem);
+    expect(std::string("pre").append(stem));
+    for (int i = 0; i < 12; ++i) expect(stem + std::to_string(i));
   }
-  EXPECT_EQ(entriesOf(context), expected);
+  EXPECT_EQ(textOf(context), expected.substr(1));
 }
 
 TEST(Context, ValuesAreWrittenOutInDecimal) {
   GenericContext context;
-  std::vector<uint64_t> values = {0, ~uint64_t{0}};
   for (uint64_t power = 1, i = 0; i < 20; ++i, power *= 10) {
-    for (const uint64_t value : {power - 1, power, power + 1, power / 9 * 7}) values.push_back(value);
+    for (const uint64_t value : {power - 1, power, power + 1, power / 9 * 7, ~power}) {
+      AddSingleValueToGenericContext(context.get(), "", "v", value);
+    }
   }
-  for (const uint64_t value : values) AddSingleValueToGenericContext(context.get(), "", "v", value);
-  const NameValueNode* node = context->valueHead;
-  for (const uint64_t value : values) {
-    ASSERT_NE(node, nullptr);
-    EXPECT_EQ(node->text, std::to_string(value));
-    EXPECT_EQ(node->value, value);
-    node = node->next;
-  }
+  EXPECT_EQ(requireSound(*context), 100U);  // each text says the value
 }
 
 TEST(Context, ElementsOfEveryWidthAreLittleEndian) {
-  const unsigned char source[17] = {1,    2,    3,    4,    5,    6,    7,    8, 0xFF,
-                                    0xFF, 0xFF, 0xFF, 0xFF, 0xFF, 0xFF, 0xFF, 9};
+  const unsigned char source[] = "\1\2\3\4\5\6\7\x88\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF";
+  const uint64_t bytes = 0x8807060504030201;
   for (unsigned width = 1; width <= 8; ++width) {
-    GenericContext context;
-    ASSERT_EQ(AddMultipleFieldsToGenericContext(context.get(), "Stat_7_", source, width, 2), 1);
-    ASSERT_EQ(AddMultipleFieldsToGenericContext(context.get(), "bare", source + 8, width, 1), 1);
     const uint64_t mask = ~uint64_t{0} >> (64 - 8 * width);
-    uint64_t second = 0;
-    for (unsigned i = 2 * width; i-- > width;) second = second << 8 | source[i];
-    EXPECT_EQ(entriesOf(context),
-              (Entries{{"Stat_7_0", 0x0807060504030201 & mask}, {"Stat_7_1", second}, {"bare", mask}}));
+    GenericContext context;
+    ASSERT_EQ(AddMultipleFieldsToGenericContext(context.get(), "bare", source, width, 1), 1);
+    ASSERT_EQ(AddMultipleFieldsToGenericContext(context.get(), "Stat_7_", source + 8 - width, width, 2), 1);
+    const std::string expected = "bare=" + std::to_string(bytes & mask) +
+                                 " Stat_7_0=" + std::to_string(bytes >> (64 - 8 * width)) +
+                                 " Stat_7_1=" + std::to_string(mask);
+    EXPECT_EQ(textOf(context), expected);
   }
 }
 
@@ -85,7 +76,7 @@ TEST(Context, ReleaseMakesItFreshAgain) {
     AddSingleValueToGenericContext(&context.entries, "", "n", 1);
     AddSingleValueToGenericContext(&context.entries, "", "m", 2);
     context.reserved2 = context.hostReads = context.exportVersion = 5;
-    EXPECT_EQ(entriesOf(context), (Entries{{"n", 1}, {"m", 2}}));
+    EXPECT_EQ(textOf(context), "n=1 m=2");
     for (int again = 0; again < 2; ++again) KSPReleaseContext(&context);
     const auto* const bytes = reinterpret_cast<const unsigned char*>(&context);
     EXPECT_TRUE(std::all_of(bytes, bytes + sizeof context, [](unsigned char byte) { return byte == 0; }));
@@ -101,56 +92,33 @@ TEST(Context, OwnersMoveTheirEntries) {
   GenericContext third;
   AddSingleValueToGenericContext(third.get(), "", "old", 2);
   third = std::move(other);
-  EXPECT_EQ(entriesOf(third), (Entries{{"n", 1}}));
+  EXPECT_EQ(textOf(third), "n=1");
   const auto found = std::ranges::find(entries(third), "n", &Entry::name);
   EXPECT_EQ((*found).value, 1U);
 }
 
 TEST(Numbers, RoundSig) {
-  const struct {
-    uint64_t value, digits, expected;
-  } cases[] = {{12345, 2, 12000},
-               {12500, 2, 13000},
-               {12499, 2, 12000},
-               {7, 0, 10},
-               {4, 0, 0},
-               {123, 5, 123},
-               {0, 3, 0},
-               {5, 1, 5},
-               {15, 1, 20},
-               {14, 1, 10},
-               {95, 1, 100},
-               {1000000000000000000, 0, 0},
-               {500000000000000000, 0, 1000000000000000000},
-               {999999999999999999, 18, 1000000000000000000},
-               {~uint64_t{0}, 4, ~uint64_t{0}},
-               {~uint64_t{0}, 2, 18000000000000000000U},
-               {~uint64_t{0}, ~uint64_t{0}, ~uint64_t{0}}};
-  for (const auto& c : cases)
-    EXPECT_EQ(roundSig(c.value, c.digits), c.expected) << c.value << ", " << c.digits;
+  constexpr uint64_t kMax = ~uint64_t{0};
+  using Row = std::array<uint64_t, 3>;  // value, digits, expected
+  for (const auto& [value, digits, expected] :
+       {Row{12345, 2, 12000}, Row{12500, 2, 13000}, Row{12499, 2, 12000}, Row{7, 0, 10}, Row{4, 0, 0},
+        Row{123, 5, 123}, Row{0, 3, 0}, Row{5, 1, 5}, Row{15, 1, 20}, Row{14, 1, 10}, Row{95, 1, 100},
+        Row{1000000000000000000, 0, 0}, Row{500000000000000000, 0, 1000000000000000000},
+        Row{999999999999999999, 18, 1000000000000000000}, Row{kMax, 4, kMax}, Row{kMax, kMax, kMax},
+        Row{kMax, 2, 18000000000000000000U}}) {
+    EXPECT_EQ(roundSig(value, digits), expected) << value << ", " << digits;
+  }
 }
 
 TEST(Numbers, UserCapacity) {
-  const struct {
-    uint32_t capacity;
-    int32_t expected;
-  } cases[] = {{0, 0},
-               {2, 0},
-               {511, 0},
-               {512, 1},
-               {120000, 128},
-               {131072, 256},
-               {1000000, 1024},
-               {1048575, 1024},
-               {1048576, 2048},
-               {1376255, 2048},
-               {1376256, 1536},
-               {1770495, 1536},
-               {1770496, 2048},
-               {1073741823, 1048576},
-               {1073741824, 2097152},
-               {~0U, 4194304}};
-  for (const auto& c : cases) EXPECT_EQ(GetUserCapacityInGB(c.capacity), c.expected) << c.capacity;
+  using Row = std::pair<uint32_t, int32_t>;
+  for (const auto& [capacity, expected] :
+       {Row{0, 0}, Row{2, 0}, Row{511, 0}, Row{512, 1}, Row{120000, 128}, Row{131072, 256},
+        Row{1000000, 1024}, Row{1048575, 1024}, Row{1048576, 2048}, Row{1376255, 2048}, Row{1376256, 1536},
+        Row{1770495, 1536}, Row{1770496, 2048}, Row{1073741823, 1048576}, Row{1073741824, 2097152},
+        Row{~0U, 4194304}}) {
+    EXPECT_EQ(GetUserCapacityInGB(capacity), expected) << capacity;
+  }
 }
 
 }  // namespace

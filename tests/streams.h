@@ -1,86 +1,94 @@
 #pragma once
 
-#include <algorithm>
 #include <cstdint>
-#include <ostream>
+#include <sstream>
 #include <string>
-#include <string_view>
 #include <vector>
 
 #include "ksp/entries.hpp"
 
-/// Streams record by record, and contexts as values to compare.
+/// Streams and entries as text; `parse_cases.txt` describes both.
 namespace ksp::test {
 
 class Stream {
  public:
-  Stream& bytes(uint64_t number, unsigned count) {
-    for (unsigned i = 0; i < count; ++i, number >>= 8) bytes_.push_back(static_cast<unsigned char>(number));
-    return *this;
-  }
+  static Stream statistics(const std::string& text) { return {text, false}; }
+  static Stream media(const std::string& text) { return {text, true}; }
 
-  Stream& stat(uint32_t key, const std::vector<uint64_t>& values) {
-    return header(key, static_cast<uint32_t>(values.size())).words(values);
-  }
-  Stream& header(uint32_t key, uint32_t count) { return bytes(key, 4).bytes(count, 4); }
-  Stream& words(const std::vector<uint64_t>& values) {
-    for (const uint64_t value : values) bytes(value, 8);
-    return *this;
-  }
-
-  /// A media record of `length` bytes, whose elements of `width` bytes are 1, 2, 3 and so on.
-  Stream& media(uint16_t key, uint16_t length, unsigned width = 4) {
-    bytes(key, 2).bytes(length, 2);
-    for (unsigned i = 0; i < length; i += width) bytes(i / width + 1, std::min(width, length - i));
-    return *this;
+  Stream(const std::string& text, bool isMedia) {
+    const unsigned headerHalf = isMedia ? 2 : 4;
+    std::istringstream tokens(text);
+    for (std::string token; tokens >> token;) {
+      size_t used = 0;
+      const uint64_t number = std::stoull(token, &used, 0);
+      const char mark = token[used];
+      const std::vector<uint64_t> values = valuesOf(token.substr(used + 1));
+      const uint64_t width = mark == '*' ? number : isMedia && number < 12288 ? 4 : 8;
+      if (mark != '*') {
+        put({number}, headerHalf);
+        put({mark == '#' ? values[0] : values.size() * (isMedia ? width : 1)}, headerHalf);
+      }
+      if (mark != '#') put(values, width);
+    }
   }
 
   /// Hands the stream to `parse` from an odd address, with nothing behind its last byte.
   template <class Parse, class Context>
-  auto run(Parse parse, Context* context) const {
-    std::vector<unsigned char> odd(1);
-    odd.insert(odd.end(), bytes_.begin(), bytes_.end());
-    return parse(context, odd.data() + 1, static_cast<uint32_t>(bytes_.size()));
+  auto into(Parse parse, Context* context) const {
+    return parse(context, bytes_.data() + 1, static_cast<uint32_t>(bytes_.size() - 1));
   }
 
  private:
-  std::vector<unsigned char> bytes_;
-};
-
-struct NamedValue {
-  std::string name;
-  uint64_t value;
-
-  bool operator==(const NamedValue&) const = default;
-  friend std::ostream& operator<<(std::ostream& out, const NamedValue& entry) {
-    return out << entry.name << '=' << entry.value;
+  static std::vector<uint64_t> valuesOf(const std::string& text) {
+    std::vector<uint64_t> values;
+    std::istringstream items(text);
+    for (std::string item; std::getline(items, item, ',');) {
+      const size_t dots = item.find("..");
+      const uint64_t last = std::stoull(item.substr(dots == item.npos ? 0 : dots + 2), nullptr, 0);
+      uint64_t value = std::stoull(item, nullptr, 0) - 1;
+      do values.push_back(++value);
+      while (value != last);
+    }
+    return values;
   }
+
+  void put(const std::vector<uint64_t>& values, uint64_t width) {
+    for (uint64_t value : values) {
+      for (uint64_t i = 0; i < width; ++i, value >>= 8) bytes_.push_back(static_cast<unsigned char>(value));
+    }
+  }
+
+  std::vector<unsigned char> bytes_ = std::vector<unsigned char>(1);
 };
-using Entries = std::vector<NamedValue>;
 
+inline GenericParserContext& listsOf(GenericParserContext& context) {
+  return context;
+}
+inline GenericParserContext& listsOf(KSPParseContext& context) {
+  return context.entries;
+}
+
+/// The entries of a context as "name=value name=value".
 template <class Context>
-Entries entriesOf(const Context& context) {
-  Entries found;
-  for (auto [name, value] : entries(context)) found.push_back({std::string(name), value});
-  return found;
+std::string textOf(const Context& context) {
+  std::ostringstream text;
+  for (auto [name, value] : entries(context)) text << (text.tellp() > 0 ? " " : "") << name << '=' << value;
+  return text.str();
 }
 
-/// Values 1, 2, 3 and so on under `stem` and their index.
-inline Entries numbered(const std::string& stem, unsigned count) {
-  Entries expected;
-  for (unsigned i = 0; i < count; ++i) expected.push_back({stem + std::to_string(i), i + 1});
-  return expected;
-}
-
-inline Entries operator+(Entries one, const Entries& other) {
-  one.insert(one.end(), other.begin(), other.end());
-  return one;
-}
-
-inline std::vector<uint64_t> countUp(unsigned count) {
-  std::vector<uint64_t> values;
-  for (uint64_t i = 1; i <= count; ++i) values.push_back(i);
-  return values;
+/// Writes each "name*3" out as "name0=1 name1=2 name2=3".
+inline std::string expanded(const std::string& text) {
+  std::ostringstream out;
+  std::istringstream tokens(text);
+  for (std::string token; tokens >> token;) {
+    const size_t star = token.find('*');
+    const unsigned long count = star == token.npos ? 1 : std::stoul(token.substr(star + 1));
+    for (unsigned long i = 0; i < count; ++i) {
+      out << (out.tellp() > 0 ? " " : "") << token.substr(0, star);
+      if (star != token.npos) out << i << '=' << i + 1;
+    }
+  }
+  return out.str();
 }
 
 }  // namespace ksp::test

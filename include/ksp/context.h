@@ -73,6 +73,7 @@ typedef struct KSPParseContext {
 /**
  * Appends one entry, named `prefix` directly followed by `name` and cut to 98 characters.
  *
+ * Every byte of its nodes that holds nothing is 0.
  * `context` may be null; `prefix` and `name` are NUL-terminated. Costs two allocations and constant time.
  * Returns 1; or 0 when `context` is null or memory ran out, with the context as it was.
  */

@@ -49,7 +49,7 @@ class EntryView : public std::ranges::view_base {
       value_ = value_->next;
       return *this;
     }
-    Iterator operator++(int) {
+    Iterator operator++(int) {  // NOLINT(cert-dcl21-cpp): iterators return a plain one
       Iterator before = *this;
       ++*this;
       return before;

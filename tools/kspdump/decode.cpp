@@ -54,8 +54,8 @@ class Collector {
 };
 
 /// Names what ended a walk before the capture's last byte.
-void findEnd(Capture& capture, ksp::StatsWalk::End end, const ksp::StatsRecord& at) {
-  using End = ksp::StatsWalk::End;
+void findEnd(Capture& capture, ksp::StatsEnd end, const ksp::StatsRecord& at) {
+  using End = ksp::StatsEnd;
   const uint64_t left = capture.bytes - at.offset;
   if (end == End::kTail) {
     capture.find(at.offset, counted(left, "byte") + " left over, fewer than a word");
@@ -125,7 +125,7 @@ void decodeSummary(Capture& capture, const unsigned char* bytes, const Decoding&
 }
 
 void decodeMedia(Capture& capture, const unsigned char* bytes, const Decoding& decoding) {
-  using End = ksp::MSPWalk::End;
+  using End = ksp::MSPEnd;
   Collector collector(capture, decoding.match);
   bool anyKnown = false;
   ksp::MSPWalk walk(bytes, static_cast<uint32_t>(capture.bytes));
