@@ -8,11 +8,14 @@
 #include <cstring>
 #include <string_view>
 
+#include "context/decimal.h"
+#include "context/little_endian.h"
+
 namespace ksp {
 
 /// Reads an unsigned little-endian word; `bytes` needs no alignment.
 inline uint32_t loadWord(const uint8_t* bytes) {
-  return uint32_t{bytes[0]} | uint32_t{bytes[1]} << 8 | uint32_t{bytes[2]} << 16 | uint32_t{bytes[3]} << 24;
+  return static_cast<uint32_t>(loadLittleEndian(bytes, 4));
 }
 
 /// How a number is shown: a short text in front, then the digits, right-aligned in at least `width` columns.
@@ -48,8 +51,6 @@ constexpr size_t kNumberRoom = kLongestNumber + 8;
 
 namespace number_detail {
 
-constexpr uint64_t kEightDigits = 100'000'000;
-
 // For a number of bit width b, adding entry b and keeping the upper half gives the count of its digits: the
 // entry holds that count and, below it, what makes the sum carry from the next power of ten on.
 constexpr std::array<uint64_t, 33> kDigitCount = [] {
@@ -72,25 +73,6 @@ inline uint32_t digitCount(uint32_t value) {
   return static_cast<uint32_t>((value + kDigitCount[static_cast<size_t>(std::bit_width(value))]) >> 32);
 }
 
-/// The eight digits of `value`, which is below 10^8, a byte each, the first in the lowest byte.
-inline uint64_t eightDigits(uint64_t value) {
-  // Each step halves every group of digits at once: two of four, four of two, eight of one.
-  const uint64_t fours = value / 10'000 | value % 10'000 << 32;
-  const uint64_t hundreds = (fours * 10'486 >> 20) & 0x0000'007F'0000'007F;
-  const uint64_t twos = hundreds | (fours - hundreds * 100) << 16;
-  const uint64_t tens = (twos * 103 >> 10) & 0x000F'000F'000F'000F;
-  return (tens | (twos - tens * 10) << 8) + 0x3030'3030'3030'3030;
-}
-
-/// Stores the bytes of `value`, the lowest first on every machine.
-inline void storeLowestFirst(char* at, uint64_t value) {
-  if constexpr (std::endian::native == std::endian::big) {
-    for (size_t i = 0; i < sizeof value; ++i) at[i] = static_cast<char>(value >> 8 * i);
-  } else {
-    std::memcpy(at, &value, sizeof value);
-  }
-}
-
 }  // namespace number_detail
 
 /// Writes `value` as `format` says and returns the end of the text; no NUL follows.
@@ -98,24 +80,23 @@ inline void storeLowestFirst(char* at, uint64_t value) {
 /// `at` has kNumberRoom bytes of room, all of which may be written. No step depends on how many digits there
 /// are: in reports that count is as good as random, and each wrong guess would cost more than all digits.
 inline char* putNumber(char* at, const NumberFormat& format, uint32_t value) {
-  using namespace number_detail;
   std::memcpy(at, format.prefix, sizeof format.prefix);
   at += format.prefixLength;
-  const uint32_t digits = digitCount(value);
+  const uint32_t digits = number_detail::digitCount(value);
   const uint32_t length = std::max<uint32_t>(digits, format.width);
   std::memset(at, format.fill, NumberFormat::kWidestField);
 
   // The digits are stored left-aligned: the ninth and tenth from the right, which mostly do not exist and are
   // then stored over, and the eight last.
-  const uint64_t last = eightDigits(value % kEightDigits);
-  const auto first = static_cast<uint32_t>(value / kEightDigits);  // at most 42
+  const uint64_t last = decimal::eightDigits(value % decimal::kEightDigits) | decimal::kZeros;
+  const auto first = static_cast<uint32_t>(value / decimal::kEightDigits);  // at most 42
   const uint32_t firstTwo = (0x3030 | first / 10 | first % 10 << 8) >> (digits == 9 ? 8 : 0);
   char* digit = at + (length - digits);
   digit[0] = static_cast<char>(firstTwo);
   digit[1] = static_cast<char>(firstTwo >> 8);
   const uint32_t beyondEight = std::max<uint32_t>(digits, 8) - 8;
   const uint32_t missing = 8 - std::min<uint32_t>(digits, 8);
-  storeLowestFirst(digit + beyondEight, last >> 8 * missing);
+  decimal::store(digit + beyondEight, last >> 8 * missing);
   return at + length;
 }
 
