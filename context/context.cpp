@@ -8,10 +8,10 @@
 #include "context/append.h"
 
 // Clients of other languages read these structures by offset.
-static_assert(offsetof(NameValueNode, text) == 0 && offsetof(NameValueNode, value) == 104 &&
-              offsetof(NameValueNode, next) == 112);
 static_assert(offsetof(KSPParseContext, entries) == 0 && sizeof(GenericParserContext) == 4 * sizeof(void*));
 #ifdef __LP64__
+static_assert(offsetof(NameValueNode, text) == 0 && offsetof(NameValueNode, value) == 104 &&
+              offsetof(NameValueNode, next) == 112);
 static_assert(offsetof(GenericParserContext, nameHead) == 0 &&
               offsetof(GenericParserContext, nameTail) == 8 &&
               offsetof(GenericParserContext, valueHead) == 16 &&

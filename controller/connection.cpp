@@ -27,7 +27,6 @@ void giveBack(Holder& holder) {
 // Looks the controller up once more and opens it through that lookup's own service handle, which does not
 // outlive the call. Returns the connection's handle, 0 for none.
 uint32_t openThroughOwnLookup(ExporterEntry*& row) {
-  row = nullptr;
   const uint32_t service = findNandExporter(&row);
   if (service == 0) {
     std::fputs("No class found", stderr);

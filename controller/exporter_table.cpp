@@ -57,7 +57,8 @@ struct MediaStatistics {
   decltype(&KSPMSPParseBufferToCxt) parser = nullptr;
 };
 
-// The controllers differ in name, driver methods and whether they export media statistics, in nothing else.
+// The controllers differ in name, property key, driver methods and whether they export media statistics, in
+// nothing else.
 constexpr ExporterEntry controllerRow(const char* className, const char* propertyKey, Methods methods,
                                       MediaStatistics media) {
   return {

@@ -1,7 +1,9 @@
 #ifndef PLATFORM_API_H
 #define PLATFORM_API_H
 
-/* What every header of the platform seam needs: export and C linkage. */
+/* What every header of the platform seam needs: fixed-width integers, export and C linkage. */
+
+#include <stdint.h>
 
 #define PLATFORM_API __attribute__((visibility("default")))
 

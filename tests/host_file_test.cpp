@@ -63,7 +63,7 @@ TEST(HostFile, FaultsNameFileLineAndReason) {
       {"[activity]\nidentifier = 3\n", "f.toml:2: 'activity.identifier' must be a text"},
       {"[activity\n", "f.toml:1: "},
       {kActivity + std::string("retry_s = -1\n"),
-       "f.toml:3: 'activity.retry_s' is -1, but must be from 0 to 31622400"},
+       "f.toml:3: 'activity.retry_s' is -1, but must be from 1 to 31622400"},
       {kActivity + std::string("retry_s = 1.5\n"), "f.toml:3: 'activity.retry_s' must be a whole number"},
       {kActivity + std::string("retrys = 1\n"), "f.toml:3: unknown key 'activity.retrys'"},
       {kActivity + std::string("\"\\u001B[2J\" = 1\n"), "f.toml:3: unknown key 'activity.?[2J'"},

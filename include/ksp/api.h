@@ -1,7 +1,9 @@
 #ifndef KSP_API_H
 #define KSP_API_H
 
-/* What every public header of libksp needs: export and C linkage. */
+/* What every public header of libksp needs: fixed-width integers, export and C linkage. */
+
+#include <stdint.h>
 
 #define KSP_API __attribute__((visibility("default")))
 

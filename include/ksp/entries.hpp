@@ -28,8 +28,8 @@ struct Entry {
 
 /// Forward range over a context's entries, in the order in which they were appended.
 ///
-/// It refers to the nodes that the context held when the view was made; appending to the context goes well
-/// with it, releasing the context does not.
+/// A view of a context that has entries shows those appended later too; one of an empty context stays empty.
+/// Releasing the context ends the view's life.
 class EntryView : public std::ranges::view_base {
  public:
   class Iterator {

@@ -29,7 +29,7 @@ typedef const SelectorPair* (*SelectorAccessor)(void);
 typedef struct ExporterEntry {
   /** Driver class; null in the terminator row alone. */
   const char* className;
-  /** Key of the driver property that describes the controller; for clients. */
+  /** Key of a property of the driver; for clients. */
   const char* propertyKey;
   /** Handle of the open connection, 0 when there is none; see <ksp/connection.h>. */
   uint32_t connection;

@@ -11,7 +11,7 @@
 KSP_BEGIN_DECLARATIONS
 
 /**
- * Appends every record of a known key, the elements of an array as `<name><index>`.
+ * Appends every record of a known key, several elements as `<name><index>` and a lone one as `<name>`.
  *
  * `buffer` holds `length` bytes of any alignment; any bytes are safe as input. Returns the number of values
  * appended by records that were appended whole. Ends at an end record, at a record that runs past the buffer,

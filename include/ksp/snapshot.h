@@ -45,8 +45,11 @@ KSP_API int KSPParseSnapshotBuffer(const void* records, uint64_t length, char* o
  * Returns 1 when no record is left, and 0 when the page was too small or, with everything untouched, when
  * `header` is null. A page too small for its time or heading leaves the cursor as it was. Otherwise the
  * record whose line did not fit is the one before the cursor, and later calls pass it over: to have it on the
- * next page, take one from `*cursor` first, unless the page was empty: then no page of this capacity holds
- * that line.
+ * next page, take one from `*cursor` first. Where a page was empty without a heading to hold, no page of this
+ * capacity holds that line.
+ *
+ * A page takes time in proportion to its records times the header's descriptors; refuse a header that counts
+ * more of these than you expect.
  */
 KSP_API int KSPParseSnapshotBufferWithInplaceParser(const void* records, uint64_t length, char* out,
                                                     uint64_t* size, const void* header, uint32_t* cursor);

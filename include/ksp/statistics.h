@@ -19,10 +19,11 @@ KSP_BEGIN_DECLARATIONS
 /**
  * Appends every record under its statistic's name, and records of unknown keys as `Stat_<key>`.
  *
- * The elements of an array statistic are named `<name>_<index>`. Returns the number of values dealt with, a
- * single value that could not be appended included. Ends early at an end marker, at a bad header, or when an
- * array could not be appended. What could not be used is reported in the error-message store. With a null
- * `context` every append fails.
+ * The elements of an array statistic are named `<name>_<index>`, a lone one `<name>_`; several values of an
+ * unknown key `Stat_<key>_<index>`. Returns the number of values dealt with, a single value that could not be
+ * appended included. Ends early at an end marker, at a bad header, or when an array or a record of an unknown
+ * key could not be appended. A failed append, and an array that differs from its configured size, are
+ * reported in the error-message store. With a null `context` every append fails.
  */
 KSP_API uint32_t KSPFTLParseBufferToCxt(GenericParserContext* context, const void* stream, uint32_t length);
 
@@ -33,11 +34,11 @@ KSP_API uint32_t KSPFTLParseStatKeyBufferToCxt(GenericParserContext* context, co
 /**
  * Appends every record of a known key and fills the summary block.
  *
- * The elements of an array statistic are named `<name><index>`; records shorter than their key needs are cut
- * to the values they have. Returns 1 when the stream was consumed to its last whole word. Returns 0 for a
- * stream without one (only `parseMarker` is written then), and when a bad header ended it (`exportVersion` is
- * set to 0, all else stays). A null `context` gives 0. Reports nothing in the error-message store; an entry
- * for which there was no memory is missing.
+ * The elements of an array statistic are named `<name><index>`, a lone one `<name>`; records shorter than
+ * their key needs are cut to the values they have. Returns 1 when the stream was consumed to its last whole
+ * word. Returns 0 for a stream without one (only `parseMarker` is written then), and when a bad header ended
+ * it (`exportVersion` is set to 0, all else stays). A null `context` gives 0. Reports nothing in the
+ * error-message store; an entry for which there was no memory is missing.
  */
 KSP_API int KSPParseBufferToCxt(KSPParseContext* context, const void* stream, uint32_t length);
 

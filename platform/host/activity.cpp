@@ -23,7 +23,6 @@ using std::chrono::steady_clock;
 ///
 /// The handler is called on the thread that `serve` runs on; stops are asked for by the main loop's thread.
 struct Activity {
- public:
   Activity(const host::HostFile& file, ActivityHandler handler) : file_(file), handler_(handler) {}
 
   /// Checks in and runs the activity when it is due, until there is no further run or a stop was asked for.
@@ -157,6 +156,7 @@ sigset_t stopSignals() {
   sigemptyset(&signals);
   sigaddset(&signals, SIGTERM);
   sigaddset(&signals, SIGINT);
+  sigaddset(&signals, SIGHUP);
   return signals;
 }
 
@@ -174,14 +174,17 @@ namespace host {
 void bringUp() {
   static std::once_flag once;
   std::call_once(once, [] {
-    const sigset_t signals = stopSignals();
-    pthread_sigmask(SIG_BLOCK, &signals, nullptr);
-    openLog();
     try {
       hostFile();
     } catch (const HostFileError& fault) {
       endStart(fault);
     }
+    // Until here a signal ends the process as it does any other; from here on something may be under way.
+    const sigset_t signals = stopSignals();
+    pthread_sigmask(SIG_BLOCK, &signals, nullptr);
+    // A run is not to end because nobody reads its lines any more.
+    signal(SIGPIPE, SIG_IGN);
+    openLog();
   });
 }
 

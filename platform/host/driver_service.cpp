@@ -7,6 +7,7 @@
 #include <map>
 #include <memory>
 #include <mutex>
+#include <new>
 #include <string>
 #include <vector>
 
@@ -145,22 +146,33 @@ Registry& registry() {
   return instance;
 }
 
+/// Callers are not made for exceptions: where memory runs out they get `otherwise`.
+template <class Result, class Call>
+Result unlessOutOfMemory(Result otherwise, Call call) {
+  try {
+    return call();
+  } catch (const std::bad_alloc&) {
+    return otherwise;
+  }
+}
+
 }  // namespace
 
 MatchingRequest* ServiceMatchByClass(const char* className) {
-  return className == nullptr ? nullptr : new MatchingRequest{className};
+  if (className == nullptr) return nullptr;
+  return unlessOutOfMemory<MatchingRequest*>(nullptr, [&] { return new MatchingRequest{className}; });
 }
 
 uint32_t GetMatchingService(uint32_t registryNumber, MatchingRequest* request) {
   const std::unique_ptr<MatchingRequest> consumed(request);
   if (registryNumber != DefaultRegistry || consumed == nullptr) return 0;
-  return registry().look(consumed->className);
+  return unlessOutOfMemory(uint32_t{0}, [&] { return registry().look(consumed->className); });
 }
 
 int32_t OpenServiceConnection(uint32_t service, int32_t process, uint32_t type, uint32_t* connection) {
   if (process != getpid()) return -EPERM;
   if (type != 0 || connection == nullptr) return -EINVAL;
-  return registry().open(service, connection);
+  return unlessOutOfMemory(int32_t{-ENOMEM}, [&] { return registry().open(service, connection); });
 }
 
 int32_t CallStructMethod(uint32_t connection, uint32_t method, const void* input, size_t inputSize,

@@ -49,13 +49,11 @@ class TableReader {
     return table_.get(key);
   }
 
-  /// The value of `key` as T, which `kind` names in messages; none when it is absent.
-  template <class T>
-  std::optional<T> value(std::string_view key, std::string_view kind) {
+  bool flag(std::string_view key) {
     const toml::node* node = find(key);
-    if (node == nullptr) return std::nullopt;
-    if (!node->is<T>()) failType(*node, key, kind);
-    return node->value_exact<T>();
+    if (node == nullptr) return false;
+    if (!node->is_boolean()) failType(*node, key, "true or false");
+    return *node->value_exact<bool>();
   }
 
   std::optional<uint32_t> number(std::string_view key, uint32_t least, uint32_t greatest) {
@@ -114,7 +112,7 @@ ActivitySettings readActivity(TableReader reader) {
     reader.fail("the activity has no 'identifier'");
   }
   settings.startAfterSeconds = reader.number("start_after_s", 0, kGreatestSeconds).value_or(0);
-  settings.retrySeconds = reader.number("retry_s", 0, kGreatestSeconds).value_or(settings.retrySeconds);
+  settings.retrySeconds = reader.number("retry_s", 1, kGreatestSeconds).value_or(settings.retrySeconds);
   settings.intervalSeconds = reader.number("interval_s", 0, kGreatestSeconds).value_or(0);
   reader.refuseUnknownKeys();
   return settings;
@@ -122,7 +120,7 @@ ActivitySettings readActivity(TableReader reader) {
 
 YieldSettings readYield(TableReader reader) {
   YieldSettings settings;
-  settings.onBattery = reader.value<bool>("on_battery", "true or false").value_or(false);
+  settings.onBattery = reader.flag("on_battery");
   settings.ioPressurePercent = reader.number("io_pressure_percent", 0, 100);
   settings.afterSeconds = reader.number("after_s", 0, kGreatestSeconds);
   settings.atCheck = reader.number("at_check", 1, std::numeric_limits<uint32_t>::max());
@@ -140,6 +138,7 @@ Step readStep(const TableReader& controller, std::string_view file, const toml::
     reader.refuseUnknownKeys();
     return step;
   }
+  if (!node.is_integer()) controller.failType(node, "steps", "whole numbers, or tables of reply and result");
   return {.reply = controller.number(node, "steps", 0, kGreatest), .result = 0};
 }
 
@@ -243,13 +242,14 @@ HostFile loadHostFile(const std::string& path) {
 }
 
 const HostFile& hostFile() {
-  static const HostFile file = [] {
+  // Never destroyed: a client may close its connection as late as its own last global object.
+  static const HostFile& file = *new HostFile([] {
     const char* named = secure_getenv("KSP_HOST_FILE");
     if (named != nullptr && *named != 0) return loadHostFile(named);
     struct stat ignored = {};
     if (stat(kSystemFile, &ignored) == 0 || errno != ENOENT) return loadHostFile(kSystemFile);
     return parseHostFile(kDefaultHost, "built-in host file");
-  }();
+  }());
   return file;
 }
 

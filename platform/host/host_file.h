@@ -14,7 +14,7 @@ struct ActivitySettings {
   std::string identifier;
   unsigned identifierLine = 0;
   uint32_t startAfterSeconds = 0;
-  /// Between a deferred run and the next one.
+  /// Between a deferred run and the next one; at least 1.
   uint32_t retrySeconds = 60;
   /// Between a finished run and the next one; 0 means that there is none and the process is ended.
   uint32_t intervalSeconds = 0;
