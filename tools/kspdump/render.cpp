@@ -127,11 +127,10 @@ void renderJsonRecords(std::string& out, const Capture& capture) {
       appender.text(record.name.empty() ? recordName(record) : record.name);
       appender.text("\"");
     }
-    std::string_view beforeValue = ",\"values\":[";
+    appender.text(",\"values\":[");
     const uint64_t* values = capture.valuesOf(record);
     for (size_t i = 0; i < record.valueCount; ++i) {
-      appender.text(beforeValue);
-      beforeValue = ",";
+      if (i != 0) appender.text(",");
       appender.number(values[i]);
     }
   }

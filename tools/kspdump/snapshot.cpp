@@ -21,12 +21,29 @@ using std::to_string;
 /// More descriptors than any controller has, and few enough for their product with the records.
 constexpr uint32_t kMostDescriptors = 4096;
 
+/// How often the fields together may show a record's bytes; overlapping ones could multiply the output.
+constexpr uint64_t kMostCoverings = 8;
+
 /// A field of every record: its label, and its words' offsets from the record's start.
 struct Field {
   std::string_view label;
   bool isArray;
   std::vector<uint64_t> words;
 };
+
+bool isShown(const ksp::SnapshotHeader& header, const ksp::FieldDescriptor& field) {
+  return field.type <= ksp::kFieldTriples && header.holds(field) && ksp::formatIsSafe(field);
+}
+
+/// The bytes of a record that the header's fields show, those that several show counted for each.
+uint64_t shownBytes(const ksp::SnapshotHeader& header) {
+  uint64_t bytes = 0;
+  for (uint32_t i = 0; i < header.descriptorCount(); ++i) {
+    const ksp::FieldDescriptor field = header.descriptor(i);
+    if (isShown(header, field)) bytes += field.type == ksp::kFieldTriples ? field.size : ksp::kWordBytes;
+  }
+  return bytes;
+}
 
 /// The fields of one layout; labels are taken from the formats that the report shows them with.
 class Layout {
@@ -44,7 +61,7 @@ class Layout {
   void add(const ksp::SnapshotHeader& header) {
     for (uint32_t i = 0; i < header.descriptorCount(); ++i) {
       const ksp::FieldDescriptor field = header.descriptor(i);
-      if (field.type > ksp::kFieldTriples || !header.holds(field) || !ksp::formatIsSafe(field)) continue;
+      if (!isShown(header, field)) continue;
       std::string label = labelOf(field.format);
       if (field.type == ksp::kFieldTriples) {
         addTriples(label, field.offset, field.size / ksp::kTripleBytes);
@@ -151,6 +168,9 @@ const char* headerFault(Bytes header) {
   if (ksp::SnapshotHeader(header.data()).descriptorCount() > kMostDescriptors) {
     return "counts more than 4096 descriptors";
   }
+  const ksp::SnapshotHeader reader(header.data());
+  if (shownBytes(reader) > kMostCoverings * reader.recordSize())
+    return "describes a record's bytes again and again";
   return nullptr;
 }
 
@@ -199,9 +219,11 @@ void decodeSnapshot(Capture& capture, Bytes records, Bytes header, const AddFiel
     return;
   }
   const ksp::SnapshotHeader reader(header.data());
-  if (!reader.hasKey()) return;
+  const uint32_t end = reader.hasKey() ? reader.endOfRecords(records.size()) : 0;
+  // The fields of records larger than the capture could be of any size.
+  if (end == 0) return;
   layout.add(reader);
-  for (uint32_t i = 0; i < reader.endOfRecords(records.size()); ++i) {
+  for (uint32_t i = 0; i < end; ++i) {
     const uint32_t offset = reader.recordOffset(i);
     if (ksp::loadWord(records.data() + offset + reader.descriptor(0).offset) != 0) addRecord(offset, i);
   }
