@@ -23,22 +23,24 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     bytes = input.subspan(headerSize);
   }
   Capture capture;
-  decode(bytes, "input", decoding, capture);
+  const auto rendered = [&](Format format) {
+    std::string text;
+    CaptureRenderer renderer(format, 80, text);
+    decode(bytes, "input", decoding, capture);
+    renderer.end(capture);
+    return text;
+  };
+  const auto document = nlohmann::json::parse(rendered(Format::kJson));
+  rendered(Format::kCsv);
+  if (rendered(Format::kTable).empty()) std::abort();
+  size_t values = 0;
+  for (const auto& record : document["records"]) values += record["values"].size();
+  if (values != capture.values.size()) std::abort();
   if (decoding.kind == Kind::kSnapshot) {
     size_t written = 0;
     reportSnapshot(capture, bytes, decoding.header, [&](std::string_view page) { written += page.size(); });
     if (decoding.header.empty() && written < 1338) std::abort();
   }
-
-  std::string json;
-  renderJson(json, capture);
-  size_t values = 0;
-  const auto document = nlohmann::json::parse(json);
-  for (const auto& record : document["records"]) values += record["values"].size();
-  if (values != capture.values.size()) std::abort();
-  std::string text;
-  renderTable(text, capture, 80);
-  renderCsv(text, capture);
   OpenMetrics metrics;
   metrics.add(capture);
   if (!metrics.text().ends_with("# EOF\n")) std::abort();

@@ -95,9 +95,9 @@ TEST_F(Kspdump, TablesShowArraysAsSumAndPicture) {
   write("h.stats", record(14, {0, 1, 2, 3, 4, 5, 6, 7, 8, 0}) + record(4, {12}));
   const std::string head =
       "h.stats: statistics, 104 bytes, 2 records\n"
-      "  KEY  NAME               VALUE  ELEMENTS (VALUE IS THEIR SUM)\n"
-      "   14  hostWriteLogHisto     36  ";
-  const std::string tail = "\n    4  hostWrites            12\n";
+      "  KEY  NAME               VALUE/SUM  ELEMENTS\n"
+      "   14  hostWriteLogHisto         36  ";
+  const std::string tail = "\n    4  hostWrites                12\n";
   EXPECT_EQ(shell("LC_ALL=C $KSPDUMP stats h.stats").out, head + "_.:-=+*#@_" + tail);
   EXPECT_EQ(shell("LC_ALL=C.UTF-8 $KSPDUMP stats h.stats").out, head + "·▁▂▃▄▅▆▇█·" + tail);
   EXPECT_EQ(run("stats --match '*Reads' a.stats").out.substr(0, 55),
@@ -150,7 +150,7 @@ TEST_F(Kspdump, FindingsNameOffsetAndReason) {
       {"stats", std::string(64, '\0'),
        "offset 0: there is no known statistic in it: is it a statistics capture?", 0},
       {"summary", sound + numbers<4>({5, 3}),
-       "offset 16: key 5 announces 3 values, but the capture ends after 0", 18},
+       "offset 16: key 5 announces 3 values, but the capture ends after 0", 1},
       {"media", media(4096, value) + "abc", "offset 8: 3 bytes left over, fewer than a record's header", 1},
       {"media", media(4096, value) + numbers<2>({4097, 4}),
        "offset 8: key 4097 announces 4 bytes, but the capture ends after 0", 1},
@@ -160,6 +160,8 @@ TEST_F(Kspdump, FindingsNameOffsetAndReason) {
        "offset 0: passWithTmodeHard(4096) carries 3 bytes, 4 configured", 0},
       {"media", media(9, value),
        "offset 0: there is no known statistic in it: is it a media statistics capture?", 0},
+      {"snapshot", std::string(504, '\0'), "offset 0: no record has a timestamp: is it a snapshot capture?",
+       52},
       {"snapshot", std::string(253, '\1'), "offset 252: 1 byte left over, fewer than a record", 26},
   };
   for (const auto& [command, bytes, finding, records] : cases) {
@@ -260,7 +262,7 @@ TEST_F(Kspdump, DiffTellsWhatChanged) {
             "new,stats,4,hostWrites,,18446744073709551615,0,-18446744073709551615\n");
   EXPECT_EQ(shell("LC_ALL=C $KSPDUMP diff stats --match 'perHost*' old new").out,
             "old -> new: 1 changed\n"
-            "KEY  NAME          OLD  NEW  DELTA  ELEMENTS' CHANGES\n"
+            "KEY  NAME          OLD  NEW  DELTA  ELEMENTS\n"
             "298  perHostReads   16   17     +1  _@\n");
   EXPECT_EQ(run("diff media old new").status, 1);
   EXPECT_EQ(run("diff stats old").status, 2);
@@ -269,14 +271,20 @@ TEST_F(Kspdump, DiffTellsWhatChanged) {
 TEST_F(Kspdump, OutputIsWholeOrNotThere) {
   write("a.stats", kStats);
   write("out", "before");
-  EXPECT_EQ(run("stats --format csv --output out a.stats").status, 0);
+  EXPECT_EQ(run("stats --output out missing").status, 3);
+  EXPECT_EQ(run("stats --output= out a.stats").err,
+            "kspdump: --output= has no value; kspdump --help tells more\n");
+  EXPECT_EQ(readAll(folder_ / "out"), "before");
+  fs::create_symlink("out", folder_ / "link");
+  EXPECT_EQ(run("stats --format csv --output link a.stats").status, 0);
   EXPECT_EQ(readAll(folder_ / "out").substr(0, 7), "source,");
+  EXPECT_TRUE(fs::is_symlink(folder_ / "link"));
   const Outcome none = run("stats --output no/such/out a.stats");
   EXPECT_EQ(none.status, 3);
   EXPECT_EQ(none.err, "kspdump: no/such/out cannot be opened: No such file or directory\n");
   EXPECT_EQ(run("stats --output /dev/full a.stats").err,
             "kspdump: /dev/full cannot be written: No space left on device\n");
-  EXPECT_EQ(std::distance(fs::directory_iterator(folder_), {}), 4) << "nothing unfinished is left";
+  EXPECT_EQ(std::distance(fs::directory_iterator(folder_), {}), 5) << "nothing unfinished is left";
   const Outcome broken = shell("$KSPDUMP stats --format csv $(yes a.stats | head -n 5000) | head -n 1");
   EXPECT_EQ(broken.out, "source,kind,key,name,element,value\n");
   EXPECT_EQ(broken.err, "");
@@ -291,6 +299,15 @@ TEST_F(Kspdump, WrongUsageEndsWithTwo) {
   }
   EXPECT_EQ(run("--version").out, "kspdump " KSP_VERSION "\n");
   EXPECT_EQ(run("stats --help").status, 0);
+}
+
+TEST_F(Kspdump, NamesStandForThemselves) {
+  write("[a]", "");
+  EXPECT_EQ(run("stats '[a]'").err, "kspdump: ./[a]: offset 0: the capture is empty\n");
+  write("\xC3\xA4\xFF\x9B", "");
+  const Outcome named = shell("LC_ALL=C.UTF-8 $KSPDUMP stats --format json *'\xFF'*");
+  EXPECT_EQ(named.err, "kspdump: \xC3\xA4\\xff\\x9b: offset 0: the capture is empty\n");
+  EXPECT_EQ(json::parse(named.out)["source"], "\xC3\xA4\\xff\\x9b");
 }
 
 TEST_F(Kspdump, NamesCannotSteerTheTerminal) {

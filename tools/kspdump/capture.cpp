@@ -78,6 +78,9 @@ std::string readFile(const std::string& path, std::vector<unsigned char>& bytes)
   const Descriptor file(path);
   struct stat status = {};
   if (file.number() < 0 || fstat(file.number(), &status) != 0) return std::strerror(errno);
+  if (S_ISREG(status.st_mode) && static_cast<uint64_t>(status.st_size) > kGreatestCapture) {
+    return "larger than 4 GiB";
+  }
   // One byte more than the file is said to hold, so that its end is seen without growing.
   const size_t expected = S_ISREG(status.st_mode) ? static_cast<size_t>(status.st_size) + 1 : kLeastRead;
   size_t size = 0;

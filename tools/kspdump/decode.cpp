@@ -3,11 +3,10 @@
 #include <fnmatch.h>
 
 #include <algorithm>
-#include <cstring>
+#include <map>
 
 #include "context/append.h"
-#include "ksp/entries.hpp"
-#include "ksp/statistics.h"
+#include "context/key_index.h"
 #include "msp/key_table.h"
 #include "msp/msp_walk.h"
 #include "stats/key_table.h"
@@ -31,16 +30,21 @@ void findSize(Capture& capture, uint64_t offset, std::string_view name, uint32_t
 
 class Collector {
  public:
-  Collector(Capture& capture, const std::string& match) : capture_(capture), match_(match) {}
+  Collector(Capture& capture, const Decoding& decoding) : capture_(capture), decoding_(decoding) {}
+
+  /// Counts a record that is not shown.
+  void passOver() { ++capture_.recordCount; }
 
   template <class ValueAt>
   void add(uint64_t offset, uint32_t key, std::string_view name, bool isArray, size_t count,
            ValueAt valueAt) {
     ++capture_.recordCount;
     const Record record = {offset, key, isArray, name, capture_.values.size(), count};
-    if (!match_.empty() && fnmatch(match_.c_str(), recordName(record).c_str(), 0) != 0) return;
+    const std::string& match = decoding_.match;
+    if (!match.empty() && fnmatch(match.c_str(), recordName(record).c_str(), 0) != 0) return;
     capture_.records.push_back(record);
     for (uint32_t i = 0; i < count; ++i) capture_.values.push_back(valueAt(i));
+    if (capture_.records.size() >= kManyRecords) decoding_.whenMany(capture_);
   }
 
   void add(uint64_t offset, uint32_t key, std::string_view name, bool isArray,
@@ -49,8 +53,10 @@ class Collector {
   }
 
  private:
+  static constexpr size_t kManyRecords = 1 << 16;
+
   Capture& capture_;
-  const std::string& match_;
+  const Decoding& decoding_;
 };
 
 /// Names what ended a walk before the capture's last byte.
@@ -71,13 +77,19 @@ void findKind(Capture& capture, bool anyKnown) {
   if (capture.bytes == 0) {
     capture.find(0, "the capture is empty");
   } else if (!anyKnown) {
-    capture.find(0, "there is no known statistic in it: is it a " + std::string(kindTitle(capture.kind)) +
-                        " capture?");
+    capture.find(0, "there is no known statistic in it: is it a " +
+                        std::string(capture.kind == Kind::kMedia ? "media " : "") + "statistics capture?");
+  }
+}
+
+void findCount(Capture& capture, const ksp::StatsRecord& record, const ksp::StatsKey& key) {
+  if (record.count != key.count) {
+    findSize(capture, record.offset, key.name, record.key, record.count, key.count, "value");
   }
 }
 
 void decodeStats(Capture& capture, const unsigned char* bytes, const Decoding& decoding) {
-  Collector collector(capture, decoding.match);
+  Collector collector(capture, decoding);
   bool anyKnown = false;
   ksp::StatsWalk walk(bytes, static_cast<uint32_t>(capture.bytes), ksp::StatsFraming::kMarked);
   ksp::StatsRecord record;
@@ -85,9 +97,7 @@ void decodeStats(Capture& capture, const unsigned char* bytes, const Decoding& d
     const ksp::StatsKey* const known = ksp::findStatsKey(record.key);
     anyKnown |= known != nullptr;
     const ksp::StatsKey* const named = decoding.byNumber ? nullptr : known;
-    if (named != nullptr && record.count != named->count) {
-      findSize(capture, record.offset, named->name, record.key, record.count, named->count, "value");
-    }
+    if (known != nullptr) findCount(capture, record, *known);
     if (record.isEmpty()) continue;
     if (named == nullptr) {
       collector.add(record.offset, record.key, "", record.count > 1, record.elements(record.count));
@@ -99,40 +109,55 @@ void decodeStats(Capture& capture, const unsigned char* bytes, const Decoding& d
   findKind(capture, anyKnown);
 }
 
-std::string_view statisticName(uint32_t key) {
-  const ksp::StatsKey* const known = ksp::findStatsKey(key);
-  return known == nullptr ? std::string_view() : std::string_view(known->name);
-}
-
+/// Decodes the statistics that the summary block copies, of each the last record, as the block has them.
 void decodeSummary(Capture& capture, const unsigned char* bytes, const Decoding& decoding) {
-  const auto length = static_cast<uint32_t>(capture.bytes);
+  KSPParseContext summary = {};
+  std::map<uint32_t, uint32_t> countOfKey;
   bool anyKnown = false;
-  ksp::StatsWalk walk(bytes, length, ksp::StatsFraming::kUnmarked);
+  ksp::StatsWalk walk(bytes, static_cast<uint32_t>(capture.bytes), ksp::StatsFraming::kMarked);
   ksp::StatsRecord record;
-  while (walk.next(record)) anyKnown |= ksp::findStatsKey(record.key) != nullptr;
+  while (walk.next(record)) {
+    const ksp::StatsKey* const known = ksp::findStatsKey(record.key);
+    if (known == nullptr) continue;
+    anyKnown = true;
+    const ksp::SummaryField* const field = ksp::findByKey<ksp::kSummaryFields>(record.key);
+    if (field == nullptr && record.key != ksp::kReadCountHisto) continue;
+    findCount(capture, record, *known);
+    if (record.isEmpty()) continue;
+    const ksp::Elements elements = record.elements(known->count);
+    countOfKey[record.key] = elements.count;
+    for (uint32_t i = 0; field == nullptr && i < elements.count; ++i) summary.readCountHisto[i] = elements[i];
+    if (field == nullptr) continue;
+    field->store(summary, elements[0]);
+    if (field->load(summary) != elements[0]) {
+      capture.find(record.offset, std::string(known->name) + "(" + to_string(record.key) + ") is " +
+                                      to_string(elements[0]) + ", of which the summary keeps 32 bits");
+    }
+  }
   findEnd(capture, walk.end(), record);
   findKind(capture, anyKnown);
 
-  ksp::LegacyContext context;
-  KSPParseBufferToCxt(context.get(), bytes, length);
-  Collector collector(capture, decoding.match);
-  for (const ksp::SummaryField& field : ksp::kSummaryFields) {
-    collector.add(0, field.key, statisticName(field.key), false, 1,
-                  [&](uint32_t) { return field.load(*context); });
+  Collector collector(capture, decoding);
+  for (const auto& [key, count] : countOfKey) {
+    const ksp::SummaryField* const field = ksp::findByKey<ksp::kSummaryFields>(key);
+    collector.add(0, key, ksp::findStatsKey(key)->name, field == nullptr, count, [&](uint32_t i) {
+      return field == nullptr ? summary.readCountHisto[i] : field->load(summary);
+    });
   }
-  collector.add(0, ksp::kReadCountHisto, statisticName(ksp::kReadCountHisto), true, ksp::kReadCounts,
-                [&](uint32_t i) { return context->readCountHisto[i]; });
 }
 
 void decodeMedia(Capture& capture, const unsigned char* bytes, const Decoding& decoding) {
   using End = ksp::MSPEnd;
-  Collector collector(capture, decoding.match);
+  Collector collector(capture, decoding);
   bool anyKnown = false;
   ksp::MSPWalk walk(bytes, static_cast<uint32_t>(capture.bytes));
   ksp::MSPRecord record;
   while (walk.next(record)) {
     const ksp::MSPKeyEntry* const known = ksp::LookupMSPKey(record.key);
-    if (known == nullptr) continue;
+    if (known == nullptr) {
+      if (!record.isEmpty() && !record.isFiller()) collector.passOver();
+      continue;
+    }
     anyKnown = true;
     const uint32_t configured = uint32_t{known->count} * known->width;
     if (record.length != configured) {
@@ -155,7 +180,7 @@ void decodeMedia(Capture& capture, const unsigned char* bytes, const Decoding& d
 }
 
 void decodeSnapshotFields(Capture& capture, Bytes bytes, const Decoding& decoding) {
-  Collector collector(capture, decoding.match);
+  Collector collector(capture, decoding);
   findSnapshotFaults(capture, bytes, decoding.header);
   decodeSnapshot(capture, bytes, decoding.header,
                  [&](uint64_t offset, uint32_t record, std::string_view label, bool isArray, auto words) {

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <functional>
 #include <span>
 #include <string>
 
@@ -14,6 +15,8 @@ struct Decoding {
   bool byNumber = false;
   /// Shell pattern that a record's name must match; empty keeps all.
   std::string match;
+  /// Called when many records are decoded, so that a caller can take them from the capture.
+  std::function<void(Capture&)> whenMany = [](Capture&) {};
   /// The snapshot's header; empty for the fixed layout.
   std::span<const unsigned char> header;
 };

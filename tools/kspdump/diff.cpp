@@ -15,7 +15,12 @@ struct Change {
   const Record* before;
   const Record* after;
 
-  const Record& any() const { return after != nullptr ? *after : *before; }
+  /// The record itself, as an array where either of the two is one.
+  Record record() const {
+    Record record = after != nullptr ? *after : *before;
+    record.isArray |= before != nullptr && before->isArray;
+    return record;
+  }
 };
 
 class Comparison {
@@ -86,32 +91,40 @@ std::string decimal(std::optional<Wide> number, const char* missing, bool withSi
 }
 
 void diffTable(std::string& out, const Comparison& comparison, size_t width) {
-  std::vector<std::vector<std::string>> rows = {{"KEY", "NAME", "OLD", "NEW", "DELTA", "ELEMENTS' CHANGES"}};
-  std::vector<size_t> widths(rows[0].size());
+  constexpr size_t kNameColumn = 1;
+  std::vector<std::vector<std::string>> rows = {{"KEY", "NAME", "OLD", "NEW", "DELTA"}};
   for (const Change& change : comparison.changes()) {
     const auto before = comparison.sumBefore(change);
     const auto after = comparison.sumAfter(change);
-    rows.push_back({std::to_string(change.any().key), printable(recordName(change.any())),
+    rows.push_back({std::to_string(change.record().key), printable(recordName(change.record())),
                     decimal(before, "-"), decimal(after, "-"),
                     decimal(Comparison::difference(before, after), "-", true)});
-    if (!change.any().isArray) continue;
-    std::vector<Wide> moves;
-    for (size_t i = 0; i < comparison.elements(change); ++i) {
-      const Wide delta = comparison.delta(change, i).value_or(0);
-      moves.push_back(delta < 0 ? -delta : delta);
-    }
-    rows.back().emplace_back();
-    renderBars(rows.back().back(), moves, std::max<size_t>(width / 5, 8));
   }
+  std::vector<size_t> widths(rows[0].size());
   for (const auto& row : rows) {
     for (size_t i = 0; i < row.size(); ++i) widths[i] = std::max(widths[i], row[i].size());
   }
-  for (const auto& row : rows) {
-    for (size_t i = 0; i < row.size(); ++i) {
-      const bool leftAligned = i == 1 || i == 5;
-      const std::string padding(i == 5 ? 0 : widths[i] - row[i].size(), ' ');
-      if (i != 0) out += "  ";
-      out += leftAligned ? row[i] + padding : padding + row[i];
+  widths[kNameColumn] = std::min(widths[kNameColumn], kWidestName);
+  size_t used = 0;
+  for (const size_t column : widths) used += column + 2;
+
+  std::vector<Wide> moves;
+  for (size_t row = 0; row < rows.size(); ++row) {
+    for (size_t i = 0; i < widths.size(); ++i) {
+      const std::string& cell = rows[row][i];
+      const std::string padding(cell.size() < widths[i] ? widths[i] - cell.size() : 0, ' ');
+      out.append(i == 0 ? "" : "  ").append(i == kNameColumn ? cell + padding : padding + cell);
+    }
+    if (row == 0) {
+      out += "  ELEMENTS";
+    } else if (const Change& change = comparison.changes()[row - 1]; change.record().isArray) {
+      moves.clear();
+      for (size_t i = 0; i < comparison.elements(change); ++i) {
+        const Wide delta = comparison.delta(change, i).value_or(0);
+        moves.push_back(delta < 0 ? -delta : delta);
+      }
+      out += "  ";
+      renderBars(out, moves, width > used + kLeastBars ? width - used : kLeastBars);
     }
     out += '\n';
   }
@@ -127,8 +140,8 @@ void appendList(std::string& out, const char* member, size_t count, ValueAt valu
 void diffJson(std::string& out, const Comparison& comparison) {
   for (const Change& change : comparison.changes()) {
     if (&change != comparison.changes().data()) out += ',';
-    out += "{\"key\":" + std::to_string(change.any().key) + ",\"name\":";
-    appendJson(out, recordName(change.any()));
+    out += "{\"key\":" + std::to_string(change.record().key) + ",\"name\":";
+    appendJson(out, recordName(change.record()));
     const size_t count = comparison.elements(change);
     appendList(out, "old", count, [&](size_t i) { return comparison.before(change, i); });
     appendList(out, "new", count, [&](size_t i) { return comparison.after(change, i); });
@@ -143,9 +156,9 @@ void diffCsv(std::string& out, const Comparison& comparison, const std::string& 
   for (const Change& change : comparison.changes()) {
     for (size_t i = 0; i < comparison.elements(change); ++i) {
       appendCsv(out, source);
-      out.append(",").append(kind).append(",").append(std::to_string(change.any().key)).append(",");
-      appendCsv(out, recordName(change.any()));
-      out.append(",").append(change.any().isArray ? std::to_string(i) : "");
+      out.append(",").append(kind).append(",").append(std::to_string(change.record().key)).append(",");
+      appendCsv(out, recordName(change.record()));
+      out.append(",").append(change.record().isArray ? std::to_string(i) : "");
       for (const auto& number :
            {comparison.before(change, i), comparison.after(change, i), comparison.delta(change, i)}) {
         out.append(",").append(decimal(number, ""));
@@ -155,16 +168,13 @@ void diffCsv(std::string& out, const Comparison& comparison, const std::string& 
   }
 }
 
-std::string diffOpenMetrics(const Comparison& comparison, const std::string& source, std::string_view kind) {
+std::string diffOpenMetrics(const Comparison& comparison, const std::string& source, Kind kind) {
   OpenMetrics metrics;
+  std::vector<std::optional<Wide>> deltas;
   for (const Change& change : comparison.changes()) {
-    const Record& record = change.any();
-    for (size_t i = 0; i < comparison.elements(change); ++i) {
-      const auto delta = comparison.delta(change, i);
-      if (!delta) continue;
-      metrics.add(kind, record.name.empty() ? "undefined" : record.name, "_delta", source, record.key,
-                  record.isArray ? static_cast<int64_t>(i) : -1, *delta);
-    }
+    deltas.clear();
+    for (size_t i = 0; i < comparison.elements(change); ++i) deltas.push_back(comparison.delta(change, i));
+    metrics.add(kind, change.record(), "_delta", source, deltas);
   }
   return metrics.text();
 }
@@ -198,7 +208,7 @@ std::string renderDiff(const Capture& before, const Capture& after, Format forma
       diffCsv(out, comparison, after.source, kind);
       break;
     case Format::kOpenMetrics:
-      out = diffOpenMetrics(comparison, after.source, kind);
+      out = diffOpenMetrics(comparison, after.source, after.kind);
       break;
   }
   return out;

@@ -4,14 +4,16 @@
 #include <cstddef>
 #include <exception>
 #include <mutex>
+#include <system_error>
 #include <thread>
 #include <vector>
 
 namespace kspdump {
 
 /// Fills results `0` to `count - 1` by `make(index, result)` on `jobs` threads and hands them to
-/// `take(index, result)` on this one, in order. The results are few and used again and again, so what one has
-/// allocated serves the next. What `make` or `take` throws is thrown from here.
+/// `take(index, result)` on this one, in order; where the system has no more threads, on fewer. The results
+/// are few and used again and again, so what one has allocated serves the next. What `make` or `take` throws
+/// is thrown from here.
 template <class Result, class Make, class Take>
 void inOrder(size_t count, size_t jobs, Make make, Take take) {
   struct Slot {
@@ -19,13 +21,13 @@ void inOrder(size_t count, size_t jobs, Make make, Take take) {
     bool isFilled = false;
   };
   std::vector<Slot> slots(jobs == 1 ? 1 : 4 * jobs);
-  if (jobs == 1) {
+  const auto alone = [&] {
     for (size_t index = 0; index < count; ++index) {
       make(index, slots[0].result);
       take(index, slots[0].result);
     }
-    return;
-  }
+  };
+  if (jobs == 1) return alone();
 
   std::mutex mutex;
   std::condition_variable changed;
@@ -58,7 +60,11 @@ void inOrder(size_t count, size_t jobs, Make make, Take take) {
   };
 
   std::vector<std::jthread> workers;
-  for (size_t i = 0; i < jobs; ++i) workers.emplace_back(work);
+  try {
+    for (size_t i = 0; i < jobs; ++i) workers.emplace_back(work);
+  } catch (const std::system_error&) {
+    if (workers.empty()) return alone();
+  }
   std::unique_lock lock(mutex);
   while (taken < count) {
     Slot& slot = slots[taken % slots.size()];

@@ -1,5 +1,6 @@
 // kspdump: decodes captures of the controller's exports for people and programs.
 
+#include <fcntl.h>
 #include <sys/ioctl.h>
 #include <unistd.h>
 
@@ -46,26 +47,30 @@ size_t terminalWidth() {
   return kUsual;
 }
 
-/// How far many files are, on one line of a terminal that nothing else is written to.
+/// How far many files are, on one line of a terminal that the results are not written to.
 class Progress {
  public:
-  explicit Progress(size_t files)
-      : files_(files), shown_(files > 1 && isatty(STDERR_FILENO) != 0 && isatty(STDOUT_FILENO) == 0) {}
+  Progress(size_t files, const Output& output)
+      : files_(files), isWanted_(files > 1 && isatty(STDERR_FILENO) != 0 && !output.isTerminal()) {}
 
   void show(size_t done) {
     const auto now = std::chrono::steady_clock::now();
-    if (!shown_ || now - last_ < std::chrono::milliseconds(100)) return;
+    if (!isWanted_ || now - last_ < std::chrono::milliseconds(100)) return;
     last_ = now;
+    isShown_ = true;
     std::fprintf(stderr, "\r%zu of %zu files", done, files_);
   }
 
+  /// Makes room for other lines.
   void hide() {
-    if (shown_ && last_ != std::chrono::steady_clock::time_point{}) std::fputs("\r\x1b[K", stderr);
+    if (isShown_) std::fputs("\r\x1b[K", stderr);
+    isShown_ = false;
   }
 
  private:
   size_t files_;
-  bool shown_;
+  bool isWanted_;
+  bool isShown_ = false;
   std::chrono::steady_clock::time_point last_;
 };
 
@@ -91,93 +96,117 @@ struct Job {
   std::string text;
 };
 
-void decodeFile(const std::string& file, const Options& options, Job& job) {
+/// Reads and decodes a file; `whenDecoded` gets parts of a large capture in between, and the whole at the
+/// end.
+template <class WhenMany, class WhenDecoded>
+void decodeFile(const std::string& file, const Options& options, Job& job, WhenMany whenMany,
+                WhenDecoded whenDecoded) {
   thread_local std::vector<unsigned char> bytes;
   job.text.clear();
-  job.unreadable = readFile(file, bytes);
-  if (job.unreadable.empty()) decode(bytes, file, options.decoding, job.capture);
-}
-
-void render(Job& job, Format format, size_t width) {
-  switch (format) {
-    case Format::kTable:
-      renderTable(job.text, job.capture, width);
-      break;
-    case Format::kJson:
-      renderJson(job.text, job.capture);
-      break;
-    case Format::kCsv:
-      renderCsv(job.text, job.capture);
-      break;
-    case Format::kOpenMetrics:
-      break;  // gathered from all files, then rendered
+  try {
+    job.unreadable = readFile(file, bytes);
+    if (!job.unreadable.empty()) return;
+    Decoding decoding = options.decoding;
+    decoding.whenMany = whenMany;
+    decode(bytes, file, decoding, job.capture);
+    whenDecoded(job.capture);
+  } catch (const std::bad_alloc&) {
+    // One capture too large does not stop the others.
+    bytes = {};
+    job = {};
+    job.unreadable = "out of memory";
   }
 }
 
-int dump(const Options& options, Output& output) {
-  const size_t width = terminalWidth();
-  Progress progress(options.files.size());
-  OpenMetrics metrics;
-  bool isFirst = true;
+/// Exit status, and whether anything was decoded that an output file could hold.
+struct Result {
   int status = kClean;
+  bool isDecoded = false;
+};
+
+Result dump(const Options& options, Output& output) {
+  const size_t width = terminalWidth();
+  const bool isAlone = options.files.size() == 1;
+  Progress progress(options.files.size(), output);
+  OpenMetrics metrics;
+  Result result;
 
   if (options.format == Format::kCsv) output.write(kCsvHead);
   inOrder<Job>(
       options.files.size(), std::min(options.jobs, options.files.size()),
       [&](size_t index, Job& job) {
-        decodeFile(options.files[index], options, job);
-        if (job.unreadable.empty()) render(job, options.format, width);
+        CaptureRenderer renderer(options.format, width, job.text);
+        const auto part = [&](Capture& capture) {
+          renderer.part(capture);
+          // What need not wait for its turn is not kept.
+          if (isAlone) {
+            output.write(job.text);
+            job.text.clear();
+          }
+        };
+        decodeFile(options.files[index], options, job, part,
+                   [&](Capture& capture) { renderer.end(capture); });
       },
       [&](size_t index, Job& job) {
-        progress.hide();
         if (!job.unreadable.empty()) {
+          progress.hide();
           complain(options.files[index], "cannot be read: " + job.unreadable);
-          status = std::max<int>(status, kUnreadable);
+          result.status = kUnreadable;
         } else {
           if (options.format == Format::kOpenMetrics) metrics.add(job.capture);
-          if (options.format == Format::kTable && !isFirst) output.write("\n");
-          isFirst = false;
+          if (options.format == Format::kTable && result.isDecoded) output.write("\n");
+          result.isDecoded = true;
           output.write(job.text);
-          status = std::max(status, tell(job.capture));
+          if (!job.capture.isClean()) progress.hide();
+          result.status = std::max(result.status, tell(job.capture));
         }
         progress.show(index + 1);
       });
   progress.hide();
   if (options.format == Format::kOpenMetrics) output.write(metrics.text());
-  return status;
+  return result;
 }
 
-int diff(const Options& options, Output& output) {
+Result diff(const Options& options, Output& output) {
   Job jobs[2];
-  int status = kClean;
+  Result result = {.status = kClean, .isDecoded = true};
   for (size_t i = 0; i < 2; ++i) {
-    decodeFile(options.files[i], options, jobs[i]);
+    const auto ignore = [](Capture&) {};
+    decodeFile(options.files[i], options, jobs[i], ignore, ignore);
     if (jobs[i].unreadable.empty()) {
-      status = std::max(status, tell(jobs[i].capture));
+      result.status = std::max(result.status, tell(jobs[i].capture));
     } else {
       complain(options.files[i], "cannot be read: " + jobs[i].unreadable);
-      status = kUnreadable;
+      result = {.status = kUnreadable, .isDecoded = false};
     }
   }
-  if (status != kUnreadable) {
+  if (result.isDecoded) {
     output.write(renderDiff(jobs[0].capture, jobs[1].capture, options.format, terminalWidth()));
   }
-  return status;
+  return result;
 }
 
-int report(const Options& options, Output& output) {
+/// Writes a snapshot's text report. The header's title and formats come from the device, so nothing but lines
+/// is let through of them.
+Result report(const Options& options, Output& output) {
   const std::string& file = options.files.front();
   std::vector<unsigned char> bytes;
   const std::string unreadable = readFile(file, bytes);
   if (!unreadable.empty()) {
     complain(file, "cannot be read: " + unreadable);
-    return kUnreadable;
+    return {.status = kUnreadable, .isDecoded = false};
   }
   Capture capture;
   capture.source = file;
   findSnapshotFaults(capture, bytes, options.decoding.header);
-  reportSnapshot(capture, bytes, options.decoding.header, [&](std::string_view text) { output.write(text); });
-  return tell(capture);
+  reportSnapshot(capture, bytes, options.decoding.header, [&](std::string_view text) {
+    if (options.decoding.header.empty()) return output.write(text);
+    for (size_t end = text.find('\n'); end != std::string_view::npos; end = text.find('\n')) {
+      output.write(printable(text.substr(0, end)) + "\n");
+      text.remove_prefix(end + 1);
+    }
+  });
+  return {.status = tell(capture), .isDecoded = true};
 }
 
 int run(Options& options) {
@@ -199,17 +228,17 @@ int run(Options& options) {
   // The report is a snapshot's table, unless it is only some of the fields that are asked for.
   const bool asReport = options.decoding.kind == Kind::kSnapshot && options.format == Format::kTable &&
                         options.decoding.match.empty();
-  const int status = options.isDiff ? diff(options, output)
-                     : asReport     ? report(options, output)
-                                    : dump(options, output);
-  output.finish();
-  return status;
+  const Result result = options.isDiff ? diff(options, output)
+                        : asReport     ? report(options, output)
+                                       : dump(options, output);
+  if (result.isDecoded) output.finish();
+  return result.status;
 }
 
 class CommandLine {
  public:
   explicit CommandLine(Options& options) : options_(options) {
-    app_.set_version_flag("--version", "kspdump " KSP_VERSION);
+    app_.set_version_flag("--version", kVersion);
     app_.require_subcommand(1);
     app_.footer(
         "FILE may be - for standard input. Exit status: 0 clean, 1 decoded with findings, which are named "
@@ -239,15 +268,44 @@ class CommandLine {
 
   /// Returns the exit status where the program ends with its command line, else -1.
   int parse(int argc, char** argv) {
-    try {
-      app_.parse(argc, argv);
-      return -1;
-    } catch (const CLI::ParseError& error) {
-      return app_.exit(error) == 0 ? kClean : kUsage;
+    std::vector<std::string> words(argv + 1, argv + argc);
+    std::string wrong = prepare(words);
+    if (wrong.empty()) {
+      std::reverse(words.begin(), words.end());
+      try {
+        app_.parse(words);
+        return -1;
+      } catch (const CLI::Success& success) {
+        return app_.exit(success);
+      } catch (const CLI::ParseError& error) {
+        wrong = error.what();
+      }
     }
+    std::fprintf(stderr, "kspdump: %s; kspdump --help tells more\n", printable(wrong).c_str());
+    return kUsage;
   }
 
  private:
+  /// Looks at the words for what the parser would take in another sense than people mean it: an option with
+  /// nothing behind its equals sign is no option of the next word, and a file may be named like a list.
+  std::string prepare(std::vector<std::string>& words) const {
+    const std::string commands = "there are stats, summary, media, snapshot and diff";
+    bool isValue = false;
+    bool hasCommand = false;
+    for (std::string& word : words) {
+      if (word == "--") break;
+      if (word.starts_with("--") && word.ends_with("=")) return word + " has no value";
+      if (!hasCommand && !word.starts_with("-")) {
+        if (std::find(std::begin(kCommands), std::end(kCommands), word) == std::end(kCommands))
+          return "there is no command " + word + "; " + commands;
+        hasCommand = true;
+      }
+      if (!isValue && (word == "++" || (word.starts_with("[") && word.ends_with("]")))) word.insert(0, "./");
+      isValue = std::find(std::begin(kWithValue), std::end(kWithValue), word) != std::end(kWithValue);
+    }
+    return hasCommand || !words.empty() ? "" : "a command is missing; " + commands;
+  }
+
   CLI::App* addMany(const char* name, const char* description, Kind kind) {
     CLI::App* command = app_.add_subcommand(name, description);
     command->add_option("FILE", options_.files, "Captures")->required()->type_name("");
@@ -267,6 +325,7 @@ class CommandLine {
         ->type_name("GLOB");
     command.add_option("--output", options_.output, "Write to a file instead of standard output")
         ->type_name("FILE");
+    command.set_version_flag("--version", kVersion);
     command.callback([this, kind] {
       options_.decoding.kind = kind;
       options_.format = static_cast<Format>(
@@ -274,6 +333,9 @@ class CommandLine {
     });
   }
 
+  static constexpr const char* kVersion = "kspdump " KSP_VERSION;
+  static constexpr const char* kCommands[] = {"stats", "summary", "media", "snapshot", "diff"};
+  static constexpr const char* kWithValue[] = {"--format", "--match", "--output", "--jobs", "--header"};
   /// In the order of Format.
   static constexpr const char* kFormatNames[] = {"table", "json", "csv", "openmetrics"};
 
@@ -282,10 +344,18 @@ class CommandLine {
   CLI::App app_{"Decodes captures of a flash storage controller's exports.", "kspdump"};
 };
 
+/// A closed standard stream stays unusable, instead of becoming the next file that is opened.
+void keepStandardDescriptors() {
+  for (int number = STDIN_FILENO; number <= STDERR_FILENO; ++number) {
+    if (fcntl(number, F_GETFD) < 0) open("/dev/null", number == STDIN_FILENO ? O_WRONLY : O_RDONLY);
+  }
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
   try {
+    keepStandardDescriptors();
     std::setlocale(LC_CTYPE, "");
     Options options;
     CommandLine commandLine(options);

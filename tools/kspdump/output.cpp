@@ -1,30 +1,70 @@
 #include "tools/kspdump/output.h"
 
 #include <fcntl.h>
+#include <poll.h>
 #include <signal.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include <cerrno>
+#include <climits>
 #include <cstdio>
+#include <cstdlib>
 #include <system_error>
 
 #include "tools/kspdump/text.h"
 
 namespace kspdump {
 
-Output::Output(std::string path) : path_(std::move(path)), descriptor_(STDOUT_FILENO) {
-  if (path_.empty()) return;
+namespace {
+
+/// The file that a signal which ends the program is to remove.
+char doomed[PATH_MAX];
+
+void removeAndEnd(int signal) {
+  unlink(doomed);
+  ::signal(signal, SIG_DFL);
+  raise(signal);
+}
+
+void removeOnSignals(const std::string& file) {
+  if (file.size() >= sizeof doomed) return;
+  file.copy(doomed, file.size());
+  for (const int number : {SIGINT, SIGTERM, SIGHUP}) {
+    if (signal(number, removeAndEnd) == SIG_IGN) signal(number, SIG_IGN);
+  }
+}
+
+/// Whether a path is a way to something that is open already, or to a device.
+bool isDirect(const std::string& path) {
   struct stat existing = {};
-  if (stat(path_.c_str(), &existing) == 0 && !S_ISREG(existing.st_mode)) {
-    descriptor_ = open(path_.c_str(), O_WRONLY | O_CLOEXEC);
+  return path.starts_with("/dev/") || path.starts_with("/proc/") ||
+         (stat(path.c_str(), &existing) == 0 && !S_ISREG(existing.st_mode));
+}
+
+/// The file behind links, so that the links stay.
+std::string target(const std::string& path) {
+  char resolved[PATH_MAX];
+  return realpath(path.c_str(), resolved) != nullptr ? resolved : path;
+}
+
+}  // namespace
+
+Output::Output(std::string path) : path_(path == "-" ? "" : std::move(path)), descriptor_(STDOUT_FILENO) {
+  if (path_.empty()) return;
+  if (isDirect(path_)) {
+    descriptor_ = open(path_.c_str(), O_WRONLY | O_TRUNC | O_CLOEXEC);
   } else {
-    unfinished_ = path_ + ".XXXXXX";
+    target_ = target(path_);
+    struct stat existing = {};
+    const bool exists = stat(target_.c_str(), &existing) == 0;
+    unfinished_ = target_.substr(0, target_.rfind('/') + 1) + ".kspdump-XXXXXX";
     descriptor_ = mkostemp(unfinished_.data(), O_CLOEXEC);
     if (descriptor_ >= 0) {
+      removeOnSignals(unfinished_);
       const mode_t mask = umask(0);
       umask(mask);
-      fchmod(descriptor_, existing.st_nlink != 0 ? existing.st_mode & 0777 : 0666 & ~mask);
+      fchmod(descriptor_, exists ? existing.st_mode & 07777 : 0666 & ~mask);
     }
   }
   if (descriptor_ < 0) {
@@ -35,7 +75,7 @@ Output::Output(std::string path) : path_(std::move(path)), descriptor_(STDOUT_FI
 
 Output::~Output() {
   if (!unfinished_.empty()) unlink(unfinished_.c_str());
-  if (descriptor_ > STDOUT_FILENO) close(descriptor_);
+  if (!path_.empty() && descriptor_ >= 0) close(descriptor_);
 }
 
 void Output::write(std::string_view text) {
@@ -46,6 +86,10 @@ void Output::write(std::string_view text) {
     } else if (errno == EPIPE) {
       signal(SIGPIPE, SIG_DFL);
       raise(SIGPIPE);
+      _exit(128 + SIGPIPE);  // where the signal is blocked
+    } else if (errno == EAGAIN) {
+      pollfd writable = {.fd = descriptor_, .events = POLLOUT, .revents = 0};
+      poll(&writable, 1, -1);
     } else if (errno != EINTR) {
       fail("cannot be written");
     }
@@ -53,12 +97,12 @@ void Output::write(std::string_view text) {
 }
 
 void Output::finish() {
-  if (descriptor_ == STDOUT_FILENO) return;
+  if (path_.empty()) return;
   const int descriptor = descriptor_;
   descriptor_ = -1;
   if (close(descriptor) != 0) fail("cannot be written");
   if (unfinished_.empty()) return;
-  if (rename(unfinished_.c_str(), path_.c_str()) != 0) fail("cannot be written");
+  if (rename(unfinished_.c_str(), target_.c_str()) != 0) fail("cannot be written");
   unfinished_.clear();
 }
 

@@ -1,9 +1,6 @@
 #include "tools/kspdump/render.h"
 
 #include <algorithm>
-#include <cctype>
-#include <nlohmann/json.hpp>
-#include <optional>
 
 #include "tools/kspdump/text.h"
 
@@ -11,10 +8,7 @@ namespace kspdump {
 
 namespace {
 
-constexpr size_t kKeyWidth = 5;
-constexpr size_t kWidestName = 34;
 constexpr size_t kGap = 2;
-constexpr size_t kLeastBars = 8;
 
 void pad(std::string& out, size_t have, size_t want) {
   out.append(want > have ? want - have : 0, ' ');
@@ -45,6 +39,9 @@ void renderBars(std::string& out, const std::vector<Wide>& values, size_t width)
   }
 }
 
+namespace {
+
+/// Appends a capture as a table for people.
 void renderTable(std::string& out, const Capture& capture, size_t width) {
   out += printable(capture.source) + ": " + std::string(kindTitle(capture.kind)) + ", " +
          std::to_string(capture.bytes) + " bytes, " + std::to_string(capture.recordCount) +
@@ -55,25 +52,28 @@ void renderTable(std::string& out, const Capture& capture, size_t width) {
   out += '\n';
   if (capture.records.empty()) return;
 
+  size_t keyWidth = 5;
   size_t nameWidth = 4;
-  size_t valueWidth = 5;
+  size_t valueWidth = 9;
   for (const Record& record : capture.records) {
+    keyWidth = std::max(keyWidth, std::to_string(record.key).size());
     nameWidth = std::max(nameWidth, recordName(record).size());
     valueWidth = std::max(valueWidth, decimal(capture.sum(record)).size());
   }
   nameWidth = std::min(nameWidth, kWidestName);
-  const size_t used = kKeyWidth + nameWidth + valueWidth + 3 * kGap;
+  const size_t used = keyWidth + nameWidth + valueWidth + 3 * kGap;
   const size_t barWidth = width > used + kLeastBars ? width - used : kLeastBars;
 
-  out += "  KEY  NAME";
-  pad(out, 4, nameWidth + kGap + valueWidth - 5);
-  out += "VALUE  ELEMENTS (VALUE IS THEIR SUM)\n";
+  pad(out, 3, keyWidth);
+  out += "KEY  NAME";
+  pad(out, 4, nameWidth + kGap + valueWidth - 9);
+  out += "VALUE/SUM  ELEMENTS\n";
   std::vector<Wide> elements;
   for (const Record& record : capture.records) {
     const std::string key = std::to_string(record.key);
     const std::string name = printable(recordName(record));
     const std::string sum = decimal(capture.sum(record));
-    pad(out, key.size(), kKeyWidth);
+    pad(out, key.size(), keyWidth);
     out.append(key).append(kGap, ' ').append(name);
     pad(out, name.size(), nameWidth);
     out.append(kGap, ' ');
@@ -87,6 +87,8 @@ void renderTable(std::string& out, const Capture& capture, size_t width) {
     out += '\n';
   }
 }
+
+}  // namespace
 
 void renderJsonFindings(std::string& out, std::string_view member, const Capture& capture) {
   out.append("\"").append(member).append("\":[");
@@ -107,10 +109,10 @@ void renderJsonFindings(std::string& out, std::string_view member, const Capture
 
 namespace {
 
-/// Appends the records' part of a capture's JSON document.
-void renderJsonRecords(std::string& out, const Capture& capture) {
+/// Appends records to a capture's JSON document, behind others where it has some.
+void renderJsonRecords(std::string& out, const Capture& capture, bool behindOthers) {
   Appender appender(out);
-  std::string_view before = "{\"key\":";
+  std::string_view before = behindOthers ? ",{\"key\":" : "{\"key\":";
   std::string name;
   for (const Record& record : capture.records) {
     appender.text(before);
@@ -135,22 +137,18 @@ void renderJsonRecords(std::string& out, const Capture& capture) {
     }
   }
   if (!capture.records.empty()) appender.text("]}");
+  appender.flush();
 }
 
-}  // namespace
-
-void renderJson(std::string& out, const Capture& capture) {
+void renderJsonHead(std::string& out, const Capture& capture) {
   out += "{\"source\":";
   appendJson(out, capture.source);
   out.append(",\"kind\":\"").append(kindName(capture.kind)).append("\",\"bytes\":");
   appendNumber(out, capture.bytes);
   out += ",\"records\":[";
-  renderJsonRecords(out, capture);
-  out += "],";
-  renderJsonFindings(out, "findings", capture);
-  out += "}\n";
 }
 
+/// Appends a capture as CSV rows, a value each.
 void renderCsv(std::string& out, const Capture& capture) {
   std::string head;
   appendCsv(head, capture.source);
@@ -173,6 +171,32 @@ void renderCsv(std::string& out, const Capture& capture) {
       appender.text("\n");
     }
   }
+  appender.flush();
+}
+
+}  // namespace
+
+void CaptureRenderer::part(Capture& capture) {
+  if (format_ != Format::kJson && format_ != Format::kCsv) return;
+  if (format_ == Format::kCsv) {
+    renderCsv(out_, capture);
+  } else {
+    if (!isBegun_) renderJsonHead(out_, capture);
+    renderJsonRecords(out_, capture, hasRecords_);
+  }
+  isBegun_ = true;
+  hasRecords_ |= !capture.records.empty();
+  capture.records.clear();
+  capture.values.clear();
+}
+
+void CaptureRenderer::end(Capture& capture) {
+  part(capture);
+  if (format_ == Format::kTable) renderTable(out_, capture, width_);
+  if (format_ != Format::kJson) return;
+  out_ += "],";
+  renderJsonFindings(out_, "findings", capture);
+  out_ += "}\n";
 }
 
 namespace {
@@ -186,8 +210,11 @@ constexpr std::string_view kReservedWords[] = {
 /// A statistic's name in the alphabet and the style of metric names: hostWriteLogHisto becomes
 /// host_write_log_histo. A reserved word is joined to the one before it: powerOnHours becomes power_onhours.
 std::string snakeCase(std::string_view name) {
-  const auto is = [&](size_t i, int (*kind)(int)) {
-    return i < name.size() && kind(static_cast<unsigned char>(name[i])) != 0;
+  // The locale has no say in this.
+  const auto isUpper = [&](size_t i) { return i < name.size() && name[i] >= 'A' && name[i] <= 'Z'; };
+  const auto isLower = [&](size_t i) { return i < name.size() && name[i] >= 'a' && name[i] <= 'z'; };
+  const auto isWord = [&](size_t i) {
+    return isUpper(i) || isLower(i) || (name[i] >= '0' && name[i] <= '9');
   };
   std::string snake;
   std::string word;
@@ -202,27 +229,23 @@ std::string snakeCase(std::string_view name) {
     word.clear();
   };
   for (size_t i = 0; i < name.size(); ++i) {
-    const bool startsWord =
-        is(i, std::isupper) && i > 0 && (!is(i - 1, std::isupper) || is(i + 1, std::islower));
-    if (startsWord || !is(i, std::isalnum)) endWord();
-    if (is(i, std::isalnum)) word += static_cast<char>(std::tolower(static_cast<unsigned char>(name[i])));
+    const bool startsWord = isUpper(i) && i > 0 && (!isUpper(i - 1) || isLower(i + 1));
+    if (startsWord || !isWord(i)) endWord();
+    if (isWord(i)) word += static_cast<char>(isUpper(i) ? name[i] - 'A' + 'a' : name[i]);
   }
   endWord();
   return snake;
 }
 
-/// A text as the value of a label or the help of a metric: UTF-8, with what would end it escaped.
-std::string escaped(std::string_view text) {
-  std::string json;
-  appendJson(json, text);
-  const auto valid = nlohmann::json::parse(json).get<std::string>();
+/// A text as UTF-8 in which what would end it, and each of `also`, is escaped.
+std::string escaped(std::string_view text, std::string_view also) {
   std::string out;
-  for (const char c : valid) {
+  for (const char c : utf8(text)) {
     if (c == '\n') {
       out += "\\n";
       continue;
     }
-    if (c == '\\' || c == '"') out += '\\';
+    if (c == '\\' || also.find(c) != std::string_view::npos) out += '\\';
     out += c;
   }
   return out;
@@ -230,36 +253,36 @@ std::string escaped(std::string_view text) {
 
 }  // namespace
 
-bool OpenMetrics::add(std::string_view kind, std::string_view name, std::string_view suffix,
-                      std::string_view source, uint32_t key, int64_t element, Wide value) {
-  std::string metricName = "ksp_" + std::string(kind) + "_" + snakeCase(name) + std::string(suffix);
-  const auto [known, isNew] = byName_.try_emplace(metricName, metrics_.size());
-  if (isNew) metrics_.push_back({std::move(metricName), escaped(name), {}, {}});
-  Metric& metric = metrics_[known->second];
+bool OpenMetrics::add(Kind kind, const Record& record, std::string_view suffix, const std::string& source,
+                      std::span<const std::optional<Wide>> values) {
+  // The summary's fields are statistics of that name.
+  const std::string_view family = kindName(kind == Kind::kSummary ? Kind::kStats : kind);
+  const std::string_view name = record.name.empty() ? "undefined" : record.name;
+  std::string metricName = "ksp_" + std::string(family) + "_" + snakeCase(name) + std::string(suffix);
+  const auto [metricAt, isNewMetric] = metricsByName_.try_emplace(metricName, metrics_.size());
+  if (isNewMetric) metrics_.push_back({std::move(metricName), escaped(name, ""), {}, {}});
+  const auto [sourceAt, isNewSource] = sourcesByName_.try_emplace(source, sources_.size());
+  if (isNewSource) sources_.push_back(escaped(source, "\""));
 
-  std::string labels = "source=\"" + escaped(source) + "\",key=\"" + std::to_string(key) + "\"";
-  if (element >= 0) labels += ",element=\"" + std::to_string(element) + "\"";
-  const auto [sample, isFirst] = metric.bySample.try_emplace(labels, metric.samples.size());
-  if (isFirst) {
-    metric.samples.emplace_back(std::move(labels), value);
-  } else {
-    metric.samples[sample->second].second = value;
+  Metric& metric = metrics_[metricAt->second];
+  const size_t from = sourceAt->second;
+  const bool isFirst = metric.seen.insert(uint64_t{from} << 32 | record.key).second;
+  if (!isFirst) {
+    std::erase_if(metric.samples,
+                  [&](const Sample& sample) { return sample.source == from && sample.key == record.key; });
+  }
+  for (uint32_t i = 0; i < values.size(); ++i) {
+    if (values[i]) metric.samples.push_back({from, record.key, record.isArray, i, *values[i]});
   }
   return isFirst;
 }
 
 void OpenMetrics::add(Capture& capture) {
-  // The summary's fields are statistics of that name.
-  const std::string_view kind = kindName(capture.kind == Kind::kSummary ? Kind::kStats : capture.kind);
+  std::vector<std::optional<Wide>> values;
   for (const Record& record : capture.records) {
-    const std::string_view name = record.name.empty() ? "undefined" : record.name;
-    bool isFirst = true;
-    for (size_t i = 0; i < record.valueCount; ++i) {
-      isFirst &= add(kind, name, "", capture.source, record.key,
-                     record.isArray ? static_cast<int64_t>(i) : -1, capture.valuesOf(record)[i]);
-    }
-    if (!isFirst) {
-      capture.find(record.offset, recordName(record) + "(" + std::to_string(record.key) +
+    values.assign(capture.valuesOf(record), capture.valuesOf(record) + record.valueCount);
+    if (!add(capture.kind, record, "", capture.source, values)) {
+      capture.find(record.offset, printable(recordName(record)) + "(" + std::to_string(record.key) +
                                       ") comes again; its last record stands");
     }
   }
@@ -268,11 +291,18 @@ void OpenMetrics::add(Capture& capture) {
 std::string OpenMetrics::text() const {
   std::string out;
   for (const Metric& metric : metrics_) {
+    if (metric.samples.empty()) continue;
     out.append("# HELP ").append(metric.name).append(" The controller's ").append(metric.help).append(".\n");
     out.append("# TYPE ").append(metric.name).append(" gauge\n");
-    for (const auto& [labels, value] : metric.samples) {
-      out.append(metric.name).append("{").append(labels).append("} ");
-      appendNumber(out, value);
+    for (const Sample& sample : metric.samples) {
+      out.append(metric.name).append("{source=\"").append(sources_[sample.source]).append("\",key=\"");
+      appendNumber(out, sample.key);
+      if (sample.isElement) {
+        out += "\",element=\"";
+        appendNumber(out, sample.element);
+      }
+      out += "\"} ";
+      appendNumber(out, sample.value);
       out += '\n';
     }
   }

@@ -113,6 +113,15 @@ class Layout {
   std::vector<Field> fields_;
 };
 
+/// Whether the first word of each of `count` records, at the offset that `keyAt` gives, is 0.
+template <class KeyAt>
+bool isUnused(Bytes records, uint64_t count, KeyAt keyAt) {
+  for (uint64_t i = 0; i < count; ++i) {
+    if (ksp::loadWord(records.data() + keyAt(i)) != 0) return false;
+  }
+  return true;
+}
+
 void reportFixed(Bytes records, const std::function<void(std::string_view)>& write) {
   constexpr uint64_t kChunk = 4096 * ksp::kRecordBytes;
   constexpr uint64_t kLongestLine = 1024;
@@ -181,6 +190,10 @@ void findSnapshotFaults(Capture& capture, Bytes records, Bytes header) {
     if (left != 0) {
       capture.find(records.size() - left, counted(left, "byte") + " left over, fewer than a record");
     }
+    const uint64_t count = records.size() / ksp::kRecordBytes;
+    if (isUnused(records, count, [](uint64_t i) { return i * ksp::kRecordBytes; })) {
+      capture.find(0, "no record has a timestamp: is it a snapshot capture?");
+    }
     return;
   }
   const ksp::SnapshotHeader reader(header.data());
@@ -198,6 +211,11 @@ void findSnapshotFaults(Capture& capture, Bytes records, Bytes header) {
   }
   if (!reader.hasKey()) {
     capture.find(0, "the header describes no field by which a record could be known to be in use");
+  } else if (const uint32_t end = reader.endOfRecords(records.size());
+             isUnused(records, end, [&](uint64_t i) {
+               return reader.recordOffset(static_cast<uint32_t>(i)) + reader.descriptor(0).offset;
+             })) {
+    capture.find(0, "no record is in use: is it a capture of this header's layout?");
   }
   const uint64_t announced = uint64_t{reader.recordSize()} * reader.recordCount();
   if (announced != records.size()) {

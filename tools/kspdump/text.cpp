@@ -24,23 +24,88 @@ std::string counted(uint64_t count, const char* noun) {
   return std::to_string(count) + " " + noun + (count == 1 ? "" : "s");
 }
 
+namespace {
+
+void appendSpelledOut(std::string& out, std::string_view bytes) {
+  constexpr char kHex[] = "0123456789abcdef";
+  for (const char byte : bytes) {
+    out += {'\\', 'x', kHex[(byte >> 4) & 0xF], kHex[byte & 0xF]};
+  }
+}
+
+/// Takes the next UTF-8 character from `text`; `character` is then its number. Returns its bytes, or one byte
+/// that is none, with a number above all characters.
+std::string_view takeCharacter(std::string_view& text, uint32_t& character) {
+  constexpr uint32_t kNone = 0xFFFFFFFF;
+  // The least number that may be written with so many bytes, and the bits of the first one that mark it.
+  struct Form {
+    uint32_t least;
+    uint8_t mask;
+    uint8_t mark;
+  };
+  constexpr Form kForms[] = {{0, 0x80, 0}, {0x80, 0xE0, 0xC0}, {0x800, 0xF0, 0xE0}, {0x10000, 0xF8, 0xF0}};
+  const auto first = static_cast<uint8_t>(text[0]);
+  size_t size = 1;
+  character = kNone;
+  for (size_t length = 1; length <= std::size(kForms) && length <= text.size(); ++length) {
+    const Form& form = kForms[length - 1];
+    if ((first & form.mask) != form.mark) continue;
+    uint32_t number = first & static_cast<uint8_t>(~form.mask);
+    bool isSound = true;
+    for (size_t i = 1; i < length; ++i) {
+      isSound &= (static_cast<uint8_t>(text[i]) & 0xC0) == 0x80;
+      number = number << 6 | (static_cast<uint8_t>(text[i]) & 0x3F);
+    }
+    if (!isSound || number < form.least || number > 0x10FFFF || (number >= 0xD800 && number < 0xE000)) break;
+    character = number;
+    size = length;
+    break;
+  }
+  const std::string_view taken = text.substr(0, size);
+  text.remove_prefix(size);
+  return taken;
+}
+
+template <class MayStand>
+std::string spelledOutUnless(std::string_view text, MayStand mayStand) {
+  std::string out;
+  while (!text.empty()) {
+    uint32_t character = 0;
+    const std::string_view bytes = takeCharacter(text, character);
+    if (mayStand(character)) {
+      out += bytes;
+    } else {
+      appendSpelledOut(out, bytes);
+    }
+  }
+  return out;
+}
+
+bool isPlain(std::string_view text) {
+  return std::all_of(text.begin(), text.end(), [](char c) { return c >= ' ' && c < 0x7F; });
+}
+
+}  // namespace
+
+std::string utf8(std::string_view text) {
+  return spelledOutUnless(text, [](uint32_t character) { return character <= 0x10FFFF; });
+}
+
 void appendJson(std::string& out, std::string_view text) {
-  const bool plain = std::all_of(text.begin(), text.end(),
-                                 [](char c) { return c >= ' ' && c < 0x7F && c != '"' && c != '\\'; });
-  if (plain) {
+  if (isPlain(text) && text.find_first_of("\"\\") == std::string_view::npos) {
     out.append("\"").append(text).append("\"");
   } else {
-    out += nlohmann::json(text).dump(-1, ' ', false, nlohmann::json::error_handler_t::replace);
+    out += nlohmann::json(utf8(text)).dump();
   }
 }
 
 void appendCsv(std::string& out, std::string_view text) {
-  if (text.find_first_of("\",\r\n") == std::string_view::npos) {
+  if (isPlain(text) && text.find_first_of("\",") == std::string_view::npos) {
     out += text;
     return;
   }
   out += '"';
-  for (const char c : text) {
+  for (const char c : utf8(text)) {
     if (c == '"') out += '"';
     out += c;
   }
@@ -48,22 +113,12 @@ void appendCsv(std::string& out, std::string_view text) {
 }
 
 std::string printable(std::string_view text) {
-  constexpr char kHex[] = "0123456789abcdef";
-  const bool utf8 = localeIsUtf8();
-  std::string safe;
-  for (size_t i = 0; i < text.size(); ++i) {
-    const auto byte = static_cast<unsigned char>(text[i]);
-    // The control characters above ASCII are two bytes in UTF-8.
-    const bool control =
-        byte < ' ' || byte == 0x7F ||
-        (byte == 0xC2 && i + 1 < text.size() && static_cast<unsigned char>(text[i + 1]) < 0xA0);
-    if (control || (!utf8 && byte >= 0x80)) {
-      safe += {'\\', 'x', kHex[byte >> 4], kHex[byte & 0xF]};
-    } else {
-      safe += text[i];
-    }
-  }
-  return safe;
+  const uint32_t most = localeIsUtf8() ? 0x10FFFF : 0x7E;
+  return spelledOutUnless(text, [&](uint32_t c) {
+    const bool isControl = c < ' ' || (c >= 0x7F && c < 0xA0);
+    const bool turnsText = (c >= 0x202A && c <= 0x202E) || (c >= 0x2066 && c <= 0x2069);
+    return c <= most && !isControl && !turnsText;
+  });
 }
 
 bool localeIsUtf8() {

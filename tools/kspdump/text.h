@@ -12,13 +12,10 @@
 
 namespace kspdump {
 
-/// Appends small pieces by way of a buffer; what it holds is appended at the end of its life.
+/// Appends small pieces by way of a buffer, the last of them with `flush`.
 class Appender {
  public:
   explicit Appender(std::string& out) : out_(out) {}
-  Appender(const Appender&) = delete;
-  Appender& operator=(const Appender&) = delete;
-  ~Appender() { flush(); }
 
   void text(std::string_view piece) {
     if (piece.size() > static_cast<size_t>(std::end(buffer_) - at_)) {
@@ -37,12 +34,12 @@ class Appender {
     at_ = std::to_chars(at_, std::end(buffer_), number).ptr;
   }
 
- private:
   void flush() {
     out_.append(buffer_, at_);
     at_ = buffer_;
   }
 
+ private:
   std::string& out_;
   char buffer_[4096];
   char* at_ = buffer_;
@@ -59,10 +56,13 @@ void appendNumber(std::string& out, Wide number);
 /// "1 byte", "2 bytes".
 std::string counted(uint64_t count, const char* noun);
 
-/// Appends a text as a JSON string; bytes that are not UTF-8 are replaced.
+/// A text as UTF-8; each byte that is not is spelled out as in \xff.
+std::string utf8(std::string_view text);
+
+/// Appends a text as a JSON string, and as UTF-8.
 void appendJson(std::string& out, std::string_view text);
 
-/// Appends a text as a CSV field.
+/// Appends a text as a CSV field, and as UTF-8.
 void appendCsv(std::string& out, std::string_view text);
 
 /// A text without anything that could steer a terminal.
