@@ -104,9 +104,15 @@ void diffTable(std::string& out, const Comparison& comparison, size_t width) {
   for (const auto& row : rows) {
     for (size_t i = 0; i < row.size(); ++i) widths[i] = std::max(widths[i], row[i].size());
   }
-  widths[kNameColumn] = std::min(widths[kNameColumn], kWidestName);
   size_t used = 0;
   for (const size_t column : widths) used += column + 2;
+  // Names give way to the numbers and to a small picture; one that is longer widens its own line.
+  constexpr size_t kLeastName = 16;
+  const size_t wanted = used + kLeastBars;
+  const size_t tooWide = wanted > width ? wanted - width : 0;
+  const size_t spare = widths[kNameColumn] > kLeastName ? widths[kNameColumn] - kLeastName : 0;
+  widths[kNameColumn] -= std::min(tooWide, spare);
+  used -= std::min(tooWide, spare);
 
   std::vector<Wide> moves;
   for (size_t row = 0; row < rows.size(); ++row) {

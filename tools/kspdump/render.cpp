@@ -9,6 +9,8 @@ namespace kspdump {
 namespace {
 
 constexpr size_t kGap = 2;
+/// The widest that a name makes its column.
+constexpr size_t kWidestName = 34;
 
 void pad(std::string& out, size_t have, size_t want) {
   out.append(want > have ? want - have : 0, ' ');

@@ -77,9 +77,7 @@ class OpenMetrics {
   std::unordered_map<std::string, size_t> sourcesByName_;
 };
 
-/// The columns that every table has: the widest a name may make its column, and the fewest that a picture
-/// has.
-inline constexpr size_t kWidestName = 34;
+/// The fewest columns that a table's pictures have.
 inline constexpr size_t kLeastBars = 8;
 
 }  // namespace kspdump
