@@ -62,7 +62,7 @@ std::string faultOf(const std::string& path) {
 TEST(HostFile, FaultsNameFileLineAndReason) {
   int faults = 0;
   for (const auto& entry : fs::directory_iterator(KSP_TEST_DATA "/hosts")) {
-    fs::path file = entry.path();
+    const fs::path& file = entry.path();
     if (file.extension() != ".toml") continue;
     const std::string said = faultOf(file);
     std::string expected;

@@ -10,17 +10,12 @@ namespace kspdump {
 
 namespace {
 
-/// A record of which something changed; one of the two is missing where it came or went.
+/// A record of which something changed, as an array where it was or is one; before or after are missing where
+/// it came or went.
 struct Change {
+  Record record;
   const Record* before;
   const Record* after;
-
-  /// The record itself, as an array where either of the two is one.
-  Record record() const {
-    Record record = after != nullptr ? *after : *before;
-    record.isArray |= before != nullptr && before->isArray;
-    return record;
-  }
 };
 
 class Comparison {
@@ -32,11 +27,15 @@ class Comparison {
     seen.clear();
     for (const Record& record : after.records) {
       const auto found = unmatched.find({record.key, seen[record.key]++});
-      const Change change = {found == unmatched.end() ? nullptr : found->second, &record};
-      if (found != unmatched.end()) unmatched.erase(found);
+      Change change = {record, nullptr, &record};
+      if (found != unmatched.end()) {
+        change.before = found->second;
+        change.record.isArray |= change.before->isArray;
+        unmatched.erase(found);
+      }
       if (differs(change)) changes_.push_back(change);
     }
-    for (const auto& [key, record] : unmatched) changes_.push_back({record, nullptr});
+    for (const auto& [key, record] : unmatched) changes_.push_back({*record, record, nullptr});
   }
 
   const std::vector<Change>& changes() const { return changes_; }
@@ -96,7 +95,7 @@ void diffTable(std::string& out, const Comparison& comparison, size_t width) {
   for (const Change& change : comparison.changes()) {
     const auto before = comparison.sumBefore(change);
     const auto after = comparison.sumAfter(change);
-    rows.push_back({std::to_string(change.record().key), printable(recordName(change.record())),
+    rows.push_back({std::to_string(change.record.key), printable(recordName(change.record)),
                     decimal(before, "-"), decimal(after, "-"),
                     decimal(Comparison::difference(before, after), "-", true)});
   }
@@ -123,7 +122,7 @@ void diffTable(std::string& out, const Comparison& comparison, size_t width) {
     }
     if (row == 0) {
       out += "  ELEMENTS";
-    } else if (const Change& change = comparison.changes()[row - 1]; change.record().isArray) {
+    } else if (const Change& change = comparison.changes()[row - 1]; change.record.isArray) {
       moves.clear();
       for (size_t i = 0; i < comparison.elements(change); ++i) {
         const Wide delta = comparison.delta(change, i).value_or(0);
@@ -146,8 +145,8 @@ void appendList(std::string& out, const char* member, size_t count, ValueAt valu
 void diffJson(std::string& out, const Comparison& comparison) {
   for (const Change& change : comparison.changes()) {
     if (&change != comparison.changes().data()) out += ',';
-    out += "{\"key\":" + std::to_string(change.record().key) + ",\"name\":";
-    appendJson(out, recordName(change.record()));
+    out += "{\"key\":" + std::to_string(change.record.key) + ",\"name\":";
+    appendJson(out, recordName(change.record));
     const size_t count = comparison.elements(change);
     appendList(out, "old", count, [&](size_t i) { return comparison.before(change, i); });
     appendList(out, "new", count, [&](size_t i) { return comparison.after(change, i); });
@@ -162,9 +161,9 @@ void diffCsv(std::string& out, const Comparison& comparison, const std::string& 
   for (const Change& change : comparison.changes()) {
     for (size_t i = 0; i < comparison.elements(change); ++i) {
       appendCsv(out, source);
-      out.append(",").append(kind).append(",").append(std::to_string(change.record().key)).append(",");
-      appendCsv(out, recordName(change.record()));
-      out.append(",").append(change.record().isArray ? std::to_string(i) : "");
+      out.append(",").append(kind).append(",").append(std::to_string(change.record.key)).append(",");
+      appendCsv(out, recordName(change.record));
+      out.append(",").append(change.record.isArray ? std::to_string(i) : "");
       for (const auto& number :
            {comparison.before(change, i), comparison.after(change, i), comparison.delta(change, i)}) {
         out.append(",").append(decimal(number, ""));
@@ -180,7 +179,7 @@ std::string diffOpenMetrics(const Comparison& comparison, const std::string& sou
   for (const Change& change : comparison.changes()) {
     deltas.clear();
     for (size_t i = 0; i < comparison.elements(change); ++i) deltas.push_back(comparison.delta(change, i));
-    metrics.add(kind, change.record(), "_delta", source, deltas);
+    metrics.add(kind, change.record, "_delta", source, deltas);
   }
   return metrics.text();
 }

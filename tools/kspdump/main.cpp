@@ -297,7 +297,7 @@ class CommandLine {
       if (word.starts_with("--") && word.ends_with("=")) return word + " has no value";
       if (!hasCommand && !word.starts_with("-")) {
         if (std::find(std::begin(kCommands), std::end(kCommands), word) == std::end(kCommands))
-          return "there is no command " + word + "; " + commands;
+          return std::string("there is no command ").append(word).append("; ").append(commands);
         hasCommand = true;
       }
       if (!isValue && (word == "++" || (word.starts_with("[") && word.ends_with("]")))) word.insert(0, "./");
