@@ -85,6 +85,14 @@ TEST_F(Kspdump, JsonKeepsEveryRecordInOrderAndExact) {
               {"key":4,"name":"hostWrites","values":[5]}]})"));
   EXPECT_EQ(std::count(result.out.begin(), result.out.end(), '\n'), 1);
 
+  // More than are rendered at a time.
+  std::string many;
+  for (uint64_t i = 0; i < 70000; ++i) many += record(4, {i});
+  write("many.stats", many);
+  const json records = json::parse(run("stats --format json many.stats").out)["records"];
+  ASSERT_EQ(records.size(), 70000u);
+  EXPECT_EQ(records[65536]["values"], json::parse("[65536]"));
+
   write("n.stats", record(298, {7, 9}));
   EXPECT_EQ(json::parse(run("stats --numbers --format json n.stats").out)["records"],
             json::parse(R"([{"key":298,"name":"Stat_298","values":[7,9]}])"));

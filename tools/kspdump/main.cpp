@@ -96,8 +96,8 @@ struct Job {
   std::string text;
 };
 
-/// Reads and decodes a file; `whenDecoded` gets parts of a large capture in between, and the whole at the
-/// end.
+/// Reads and decodes a file; of a large capture `whenMany` gets parts in between, and `whenDecoded` gets what
+/// is left at the end.
 template <class WhenMany, class WhenDecoded>
 void decodeFile(const std::string& file, const Options& options, Job& job, WhenMany whenMany,
                 WhenDecoded whenDecoded) {
