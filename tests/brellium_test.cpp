@@ -67,6 +67,18 @@ class Daemon {
   int terminal_ = -1;
 };
 
+/// A host file of the test's own, from behind the heading of the activity's table on.
+class HostFile {
+ public:
+  explicit HostFile(const std::string& text) { std::ofstream(name_) << "[activity]\n" << text; }
+  ~HostFile() { std::filesystem::remove(name_); }
+
+  const std::string& name() const { return name_; }
+
+ private:
+  const std::string name_ = testing::TempDir() + "host" + std::to_string(getpid()) + ".toml";
+};
+
 std::string example(const std::string& name) {
   return std::string(KSP_EXAMPLE_HOSTS) + "/" + name + ".toml";
 }
@@ -110,17 +122,19 @@ TEST(Brellium, HostsWithoutWorkEndAtOnce) {
 }
 
 TEST(Brellium, AStopYieldsClosesAndEndsClean) {
-  for (const int signal : {SIGTERM, SIGINT}) {
-    Daemon daemon(example("default"));
+  const HostFile endless(
+      "identifier = \"com.vantor.brellium\"\n[[controller]]\nclass = \"KSPStorage\"\nsteps = [1]\n");
+  for (const int signal : {SIGTERM, SIGINT, SIGHUP}) {
+    Daemon daemon(endless.name());
     daemon.lines("  - defer chck 1/6 - sleeping");
     daemon.signal(signal);
     const Lines rest = daemon.lines();
     ASSERT_GE(rest.size(), 4u);
     const Lines end(rest.end() - 4, rest.end());
     EXPECT_TRUE(end[0].starts_with("  - defer chck ") && end[0].ends_with("/6 - deferring!!!!")) << end[0];
-    EXPECT_EQ(Lines(end.begin() + 1, end.end()),
-              (Lines{"iter# 1 - DONE for now - more BDR", "closing io service connection",
-                     "deferring brellium daemon"}));
+    EXPECT_TRUE(end[1].starts_with("iter# ") && end[1].ends_with(" - DONE for now - more BDR")) << end[1];
+    EXPECT_EQ(end[2], "closing io service connection");
+    EXPECT_EQ(end[3], "deferring brellium daemon");
     EXPECT_EQ(daemon.exitStatus(), 0);
   }
 }
@@ -139,15 +153,13 @@ TEST(Brellium, AWrongHostFileStartsNothing) {
   EXPECT_EQ(missing.lines(), Lines{"brellium: no/such.toml: cannot be read: No such file or directory"});
   EXPECT_EQ(missing.exitStatus(), 78);
 
-  const std::string other = testing::TempDir() + "other" + std::to_string(getpid()) + ".toml";
-  std::ofstream(other) << "[activity]\nidentifier = \"another\"\n";
-  Daemon unknown(other);
+  const HostFile other("identifier = \"another\"\n");
+  Daemon unknown(other.name());
   EXPECT_EQ(unknown.lines(),
-            (Lines{"start brellium", "brellium: " + other +
+            (Lines{"start brellium", "brellium: " + other.name() +
                                          ":2: the host declares activity 'another', but none "
                                          "named 'com.vantor.brellium'"}));
   EXPECT_EQ(unknown.exitStatus(), 78);
-  std::filesystem::remove(other);
 }
 
 TEST(HostDriver, AClientReachesTheControllerThatAccepts) {
