@@ -241,9 +241,9 @@ class CommandLine {
     app_.set_version_flag("--version", kVersion);
     app_.require_subcommand(1);
     app_.footer(
-        "FILE may be - for standard input. Exit status: 0 clean, 1 decoded with findings, which are named "
-        "on\n"
-        "standard error, 2 wrong usage, 3 a file could not be read or written.");
+        "FILE may be - for standard input. Exit status: 0 clean, 1 decoded with findings,\n"
+        "which are named on standard error, 2 wrong usage, 3 a file could not be read or\n"
+        "written.");
 
     CLI::App* stats = addMany("stats", "Decode statistics streams", Kind::kStats);
     stats->add_flag("--numbers", options_.decoding.byNumber, "Name records by their key number");
@@ -309,8 +309,7 @@ class CommandLine {
   CLI::App* addMany(const char* name, const char* description, Kind kind) {
     CLI::App* command = app_.add_subcommand(name, description);
     command->add_option("FILE", options_.files, "Captures")->required()->type_name("");
-    command
-        ->add_option("--jobs", options_.jobs, "Files decoded at the same time, as many as cores by default")
+    command->add_option("--jobs", options_.jobs, "Files decoded at a time; all cores by default")
         ->check(CLI::Range(1, 1024))
         ->option_text("N");
     addCommon(*command, kind);
