@@ -13,10 +13,7 @@
 #include "bench/ratio.h"
 #include "ksp/entries.hpp"
 #include "ksp/ksp.h"
-#include "msp/key_table.h"
-#include "msp/msp_walk.h"
-#include "stats/key_table.h"
-#include "stats/stats_walk.h"
+#include "ksp/records.hpp"
 
 namespace {
 
@@ -41,7 +38,7 @@ class Counters {
 Bytes statisticsStream() {
   Bytes bytes;
   Counters counters;
-  for (const ksp::StatsKey& key : ksp::kStatsKeys) {
+  for (const ksp::KeyEntry& key : ksp::kStatsKeys) {
     put(bytes, key.key, 4);
     put(bytes, key.count, 4);
     for (uint32_t i = 0; i < key.count; ++i) put(bytes, counters.next(), 8);
@@ -52,7 +49,7 @@ Bytes statisticsStream() {
 Bytes mediaStream() {
   Bytes bytes;
   Counters counters;
-  for (const ksp::MSPKeyEntry& key : ksp::mspKeyTable) {
+  for (const ksp::KeyEntry& key : ksp::mspKeyTable) {
     put(bytes, key.key, 2);
     put(bytes, uint64_t{key.count} * key.width, 2);
     for (unsigned i = 0; i < key.count; ++i) put(bytes, counters.next(), key.width);
@@ -91,8 +88,8 @@ void plainAppend(GenericParserContext& context, const char* prefix, const char* 
 
 template <Nodes nodes>
 void plainAppend(GenericParserContext& context, const char* name, const ksp::Elements& elements) {
-  if (elements.count == 1) return plainAppend<nodes>(context, "", name, elements[0]);
-  for (uint32_t i = 0; i < elements.count; ++i) {
+  if (elements.size() == 1) return plainAppend<nodes>(context, "", name, elements[0]);
+  for (uint32_t i = 0; i < elements.size(); ++i) {
     char index[16];
     static_cast<void>(std::snprintf(index, sizeof index, "%d", static_cast<int>(i)));
     plainAppend<nodes>(context, name, index, elements[i]);
@@ -100,31 +97,29 @@ void plainAppend(GenericParserContext& context, const char* name, const ksp::Ele
 }
 
 void plainGeneric(GenericParserContext* context, const void* stream, uint32_t length) {
-  ksp::StatsWalk walk(stream, length, ksp::StatsFraming::kMarked);
-  for (ksp::StatsRecord record; walk.next(record);) {
-    const ksp::StatsKey* const key = ksp::findStatsKey(record.key);
-    if (key == nullptr) continue;
+  ksp::StatisticsRecords records(stream, length);
+  for (const ksp::Record& record : records) {
+    if (record.row == nullptr) continue;
     char name[KSPNodeTextSize];
-    static_cast<void>(std::snprintf(name, sizeof name, key->isArray() ? "%s_" : "%s", key->name.data()));
-    plainAppend<Nodes::kZeroed>(*context, name, record.elements(key->count));
+    static_cast<void>(
+        std::snprintf(name, sizeof name, record.isArray ? "%s_" : "%s", record.row->name.data()));
+    plainAppend<Nodes::kZeroed>(*context, name, record.elements);
   }
 }
 
 void plainLegacy(KSPParseContext* context, const void* stream, uint32_t length) {
-  ksp::StatsWalk walk(stream, length, ksp::StatsFraming::kUnmarked);
-  for (ksp::StatsRecord record; walk.next(record);) {
-    const ksp::StatsKey* const key = ksp::findStatsKey(record.key);
-    if (key == nullptr) continue;
-    plainAppend<Nodes::kPlain>(context->entries, key->name.data(), record.elements(key->count));
+  ksp::StatisticsRecords records(stream, length, ksp::StatisticsFraming::kUnmarked);
+  for (const ksp::Record& record : records) {
+    if (record.row == nullptr) continue;
+    plainAppend<Nodes::kPlain>(context->entries, record.row->name.data(), record.elements);
   }
 }
 
 void plainMedia(GenericParserContext* context, const void* stream, uint32_t length) {
-  ksp::MSPWalk walk(stream, length);
-  for (ksp::MSPRecord record; walk.next(record);) {
-    const ksp::MSPKeyEntry* const key = ksp::LookupMSPKey(record.key);
-    if (key == nullptr) continue;
-    plainAppend<Nodes::kZeroed>(*context, key->name.data(), {record.value, key->width, key->count});
+  ksp::MediaRecords records(stream, length);
+  for (const ksp::Record& record : records) {
+    if (record.row == nullptr) continue;
+    plainAppend<Nodes::kZeroed>(*context, record.row->name.data(), record.elements);
   }
 }
 

@@ -6,6 +6,8 @@
 #include <string_view>
 
 #include "context/append.h"
+#include "context/list_ends.h"
+#include "ksp/detail/elements.hpp"
 
 // Clients of other languages read these structures by offset.
 static_assert(offsetof(KSPParseContext, entries) == 0 && sizeof(GenericParserContext) == 4 * sizeof(void*));
@@ -56,7 +58,7 @@ int AddSingleValueToGenericContext(GenericParserContext* context, const char* pr
 
 int AddMultipleFieldsToGenericContext(GenericParserContext* context, const char* name, const void* source,
                                       uint32_t width, uint32_t count) {
-  const ksp::Elements elements = {static_cast<const unsigned char*>(source), width, count};
+  const ksp::Elements elements(static_cast<const unsigned char*>(source), width, count);
   return ksp::appendElements(context, elements, view(name)) ? 1 : 0;
 }
 

@@ -3,19 +3,16 @@
 #include <algorithm>
 #include <cstring>
 
+#include "ksp/detail/little_endian.hpp"
+#include "snapshot/word.h"
+
 namespace ksp {
-
-namespace {
-
-constexpr uint64_t kWordBytes = 4;
-
-}  // namespace
 
 FieldDescriptor SnapshotHeader::descriptor(uint32_t index) const {
   const uint8_t* bytes =
       bytes_ + uint64_t{tableOffset()} + kTableFixedBytes + uint64_t{kDescriptorBytes} * index;
   return {
-      .type = static_cast<uint16_t>(bytes[0] | bytes[1] << 8),
+      .type = loadLittleEndian<uint16_t>(bytes),
       .offset = loadWord(bytes + 4),
       .size = loadWord(bytes + 8),
       .format = reinterpret_cast<const char*>(bytes + 12),
@@ -30,13 +27,13 @@ uint32_t SnapshotHeader::endOfRecords(uint64_t length) const {
 
 bool SnapshotHeader::holds(const FieldDescriptor& field) const {
   const uint64_t size = field.type == kFieldTriples ? field.size : kWordBytes;
-  return field.offset + size <= recordSize();
+  return uint64_t{field.offset} + size <= recordSize();
 }
 
 bool SnapshotHeader::hasKey() const {
   if (descriptorCount() == 0) return false;
   const FieldDescriptor first = descriptor(0);
-  return holds(first) && first.offset + kWordBytes <= recordSize();
+  return holds(first) && uint64_t{first.offset} + kWordBytes <= recordSize();
 }
 
 const char* snapshotHeaderFault(const void* header, uint64_t size) {

@@ -2,7 +2,7 @@
 
 #include <cstdint>
 
-#include "snapshot/number.h"
+#include "snapshot/word.h"
 
 namespace ksp {
 

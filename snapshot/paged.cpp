@@ -4,11 +4,12 @@
 #include <ctime>
 
 #include "ksp/snapshot.h"
+#include "numbers/format.h"
 #include "snapshot/field_format.h"
 #include "snapshot/header.h"
 #include "snapshot/legend.h"
-#include "snapshot/number.h"
 #include "snapshot/triples.h"
+#include "snapshot/word.h"
 #include "snapshot/writer.h"
 
 namespace {

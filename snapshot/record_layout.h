@@ -3,12 +3,11 @@
 #include <cstddef>
 #include <cstdint>
 
-#include "snapshot/number.h"
+#include "numbers/format.h"
 
 namespace ksp {
 
 inline constexpr uint64_t kRecordBytes = 252;
-inline constexpr size_t kWordBytes = 4;
 inline constexpr size_t kPriorities = 4;
 
 // Words of a record that are not just numbers with a label.

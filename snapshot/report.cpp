@@ -4,10 +4,11 @@
 #include <string_view>
 
 #include "ksp/snapshot.h"
+#include "numbers/format.h"
 #include "snapshot/legend.h"
-#include "snapshot/number.h"
 #include "snapshot/record_layout.h"
 #include "snapshot/triples.h"
+#include "snapshot/word.h"
 #include "snapshot/writer.h"
 
 namespace {

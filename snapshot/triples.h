@@ -3,7 +3,8 @@
 #include <cstddef>
 #include <cstdint>
 
-#include "snapshot/number.h"
+#include "numbers/format.h"
+#include "snapshot/word.h"
 
 namespace ksp {
 

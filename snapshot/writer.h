@@ -6,7 +6,7 @@
 #include <cstdio>
 #include <string_view>
 
-#include "snapshot/number.h"
+#include "numbers/format.h"
 
 namespace ksp {
 

@@ -5,6 +5,7 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cstdio>
 #include <fstream>
 #include <functional>
@@ -14,12 +15,9 @@
 #include "ksp/error.h"
 #include "ksp/exporter.h"
 #include "ksp/media_statistics.h"
+#include "ksp/records.hpp"
 #include "ksp/statistics.h"
-#include "msp/key_table.h"
-#include "msp/msp_walk.h"
 #include "platform/driver_service.h"
-#include "stats/key_table.h"
-#include "stats/stats_walk.h"
 #include "tests/streams.h"
 
 const char PropertyMatchKey[] = "of this test";
@@ -64,11 +62,12 @@ std::string outcome(const Stream& stream, Parse parse, bool lost) {
   return std::to_string(result) + " " + textOf(context);
 }
 
-template <class Record, class Walk>
-std::string walked(Walk walk, std::initializer_list<const char*> ends) {
-  Record record;
-  while (walk.next(record)) continue;
-  return std::to_string(record.offset) + " " + ends.begin()[static_cast<int>(walk.end())];
+template <class Records>
+std::string walked(Records records) {
+  constexpr const char* kReasons[] = {"", "complete", "tail", "marker", "invalid", "overrun"};
+  std::ranges::for_each(records, [](const Record&) {});
+  const Ending& ending = records.ending();
+  return std::to_string(ending.offset) + " " + kReasons[static_cast<int>(ending.reason)];
 }
 
 std::string run(const std::string& parser, const std::string& kind, const std::string& text) {
@@ -81,9 +80,7 @@ std::string run(const std::string& parser, const std::string& kind, const std::s
   if (parser.starts_with("legacy")) return outcome<LegacyContext>(stream, KSPParseBufferToCxt, lost);
   if (parser.starts_with("media")) return outcome<GenericContext>(stream, KSPMSPParseBufferToCxt, lost);
   const auto walk = [&](const void*, const void* bytes, uint32_t length) {
-    return isMedia ? walked<MSPRecord>(MSPWalk(bytes, length), {"", "complete", "tail", "marker", "overrun"})
-                   : walked<StatsRecord>(StatsWalk(bytes, length, StatsFraming::kMarked),
-                                         {"", "complete", "tail", "marker", "invalid", "overrun"});
+    return isMedia ? walked(MediaRecords(bytes, length)) : walked(StatisticsRecords(bytes, length));
   };
   return parser == "walk" ? stream.into(walk, static_cast<void*>(nullptr)) : "no parser has this name";
 }
@@ -170,14 +167,14 @@ TEST(Statistics, SummaryCopiesItsStatistics) {
 
 TEST(KeyTables, AreCompleteAndFindTheirRows) {
   std::map<unsigned, unsigned> keysOfCount;
-  for (const StatsKey& key : kStatsKeys) ++keysOfCount[key.count];
+  for (const KeyEntry& key : kStatsKeys) ++keysOfCount[key.count];
   const std::map<unsigned, unsigned> expected = {
       {1, 535}, {2, 15}, {3, 3},  {4, 12}, {5, 12}, {6, 3},  {8, 12}, {9, 2},   {10, 23}, {11, 2}, {12, 2},
       {16, 9},  {20, 1}, {22, 3}, {30, 1}, {32, 9}, {45, 1}, {64, 2}, {100, 2}, {160, 1}, {256, 1}};
   EXPECT_EQ(keysOfCount, expected);
   unsigned statistics = 0, media = 0, singles = 0;
   for (uint32_t key = 0; key <= UINT16_MAX; ++key) {
-    if (const StatsKey* const row = findStatsKey(key)) statistics += row->key == key;
+    if (const KeyEntry* const row = findStatsKey(key)) statistics += row->key == key;
     const MSPKeyEntry* const row = LookupMSPKey(static_cast<uint16_t>(key));
     if (row == nullptr) continue;
     media += row->key == key && row->width == (key < 12288 ? 4 : 8);

@@ -13,8 +13,7 @@
 #include <string_view>
 #include <vector>
 
-#include "msp/key_table.h"
-#include "stats/key_table.h"
+#include "ksp/records.hpp"
 
 namespace {
 
@@ -90,7 +89,7 @@ constexpr std::pair<uint32_t, uint64_t> kConstants[] = {{1, 7},   {49, 16384}, {
 std::array<Bytes, 2> statisticsOfTwoDays(uint64_t seed) {
   Random random(seed);
   std::array<Bytes, 2> days;
-  for (const ksp::StatsKey& key : ksp::kStatsKeys) {
+  for (const ksp::KeyEntry& key : ksp::kStatsKeys) {
     Statistic statistic(random, key.count, 36);
     for (Bytes& day : days) {
       put(day, key.key, 4);
@@ -111,7 +110,7 @@ std::array<Bytes, 2> statisticsOfTwoDays(uint64_t seed) {
 std::array<Bytes, 2> mediaOfTwoDays(uint64_t seed) {
   Random random(seed);
   std::array<Bytes, 2> days;
-  for (const ksp::MSPKeyEntry& key : ksp::mspKeyTable) {
+  for (const ksp::KeyEntry& key : ksp::mspKeyTable) {
     Statistic statistic(random, key.count, key.width == 4 ? 20 : 40);
     for (Bytes& day : days) {
       put(day, key.key, 2);

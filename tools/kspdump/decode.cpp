@@ -2,16 +2,10 @@
 
 #include <fnmatch.h>
 
-#include <algorithm>
 #include <map>
 
-#include "context/append.h"
-#include "context/key_index.h"
-#include "msp/key_table.h"
-#include "msp/msp_walk.h"
-#include "stats/key_table.h"
-#include "stats/stats_walk.h"
-#include "stats/summary.h"
+#include "ksp/records.hpp"
+#include "ksp/summary.hpp"
 #include "tools/kspdump/snapshot.h"
 #include "tools/kspdump/text.h"
 
@@ -47,9 +41,9 @@ class Collector {
     if (capture_.records.size() >= kManyRecords) decoding_.whenMany(capture_);
   }
 
-  void add(uint64_t offset, uint32_t key, std::string_view name, bool isArray,
-           const ksp::Elements& elements) {
-    add(offset, key, name, isArray, elements.count, [&](uint32_t i) { return elements[i]; });
+  void add(const ksp::Record& record) {
+    add(record.offset, record.key, record.isListed() ? std::string_view(record.row->name) : "",
+        record.isArray, record.elements.size(), [&](uint32_t i) { return record.elements[i]; });
   }
 
  private:
@@ -59,18 +53,25 @@ class Collector {
   const Decoding& decoding_;
 };
 
-/// Names what ended a walk before the capture's last byte.
-void findEnd(Capture& capture, ksp::StatsEnd end, const ksp::StatsRecord& at) {
-  using End = ksp::StatsEnd;
-  const uint64_t left = capture.bytes - at.offset;
-  if (end == End::kTail) {
-    capture.find(at.offset, counted(left, "byte") + " left over, fewer than a word");
-  } else if (end == End::kInvalidKey) {
-    capture.find(at.offset, "key " + to_string(at.key) + " is invalid, so the rest cannot be read");
-  } else if (end == End::kOverrun) {
-    capture.find(at.offset, "key " + to_string(at.key) + " announces " + counted(at.count, "value") +
-                                ", but the capture ends after " + to_string(left / ksp::kStatsWordSize - 1));
+/// Names what ended a walk before the capture's last byte; a header has `headerSize` bytes.
+void findEnd(Capture& capture, const ksp::Ending& ending, const char* headerName, uint32_t headerSize,
+             const char* unit, uint32_t unitSize) {
+  using Reason = ksp::EndReason;
+  const uint64_t left = capture.bytes - ending.offset;
+  if (ending.reason == Reason::kTail) {
+    capture.find(ending.offset, counted(left, "byte") + " left over, fewer than a " + headerName);
+  } else if (ending.reason == Reason::kInvalidKey) {
+    capture.find(ending.offset, "key " + to_string(ending.key) + " is invalid, so the rest cannot be read");
+  } else if (ending.reason == Reason::kOverrun) {
+    capture.find(ending.offset, "key " + to_string(ending.key) + " announces " +
+                                    counted(ending.announced, unit) + ", but the capture ends after " +
+                                    to_string((left - headerSize) / unitSize));
   }
+}
+
+void findStatsEnd(Capture& capture, const ksp::Ending& ending) {
+  constexpr uint32_t kWord = ksp::StatisticsRecords::kWordSize;
+  findEnd(capture, ending, "word", kWord, "value", kWord);
 }
 
 void findKind(Capture& capture, bool anyKnown) {
@@ -82,30 +83,23 @@ void findKind(Capture& capture, bool anyKnown) {
   }
 }
 
-void findCount(Capture& capture, const ksp::StatsRecord& record, const ksp::StatsKey& key) {
-  if (record.count != key.count) {
-    findSize(capture, record.offset, key.name, record.key, record.count, key.count, "value");
-  }
+void findSize(Capture& capture, const ksp::Record& record, const char* unit) {
+  if (record.isAsConfigured()) return;
+  findSize(capture, record.offset, record.row->name, record.key, record.announced, record.configured, unit);
 }
 
 void decodeStats(Capture& capture, const unsigned char* bytes, const Decoding& decoding) {
   Collector collector(capture, decoding);
   bool anyKnown = false;
-  ksp::StatsWalk walk(bytes, static_cast<uint32_t>(capture.bytes), ksp::StatsFraming::kMarked);
-  ksp::StatsRecord record;
-  while (walk.next(record)) {
-    const ksp::StatsKey* const known = ksp::findStatsKey(record.key);
-    anyKnown |= known != nullptr;
-    const ksp::StatsKey* const named = decoding.byNumber ? nullptr : known;
-    if (known != nullptr) findCount(capture, record, *known);
-    if (record.isEmpty()) continue;
-    if (named == nullptr) {
-      collector.add(record.offset, record.key, "", record.count > 1, record.elements(record.count));
-    } else {
-      collector.add(record.offset, record.key, named->name, named->isArray(), record.elements(named->count));
-    }
+  ksp::StatisticsRecords records(
+      bytes, capture.bytes, ksp::StatisticsFraming::kMarked,
+      decoding.byNumber ? ksp::StatisticsNaming::kByNumber : ksp::StatisticsNaming::kByTable);
+  for (const ksp::Record& record : records) {
+    anyKnown |= record.row != nullptr;
+    findSize(capture, record, "value");
+    if (record.counts) collector.add(record);
   }
-  findEnd(capture, walk.end(), record);
+  findStatsEnd(capture, records.ending());
   findKind(capture, anyKnown);
 }
 
@@ -114,32 +108,32 @@ void decodeSummary(Capture& capture, const unsigned char* bytes, const Decoding&
   KSPParseContext summary = {};
   std::map<uint32_t, uint32_t> countOfKey;
   bool anyKnown = false;
-  ksp::StatsWalk walk(bytes, static_cast<uint32_t>(capture.bytes), ksp::StatsFraming::kMarked);
-  ksp::StatsRecord record;
-  while (walk.next(record)) {
-    const ksp::StatsKey* const known = ksp::findStatsKey(record.key);
-    if (known == nullptr) continue;
+  ksp::StatisticsRecords records(bytes, capture.bytes);
+  for (const ksp::Record& record : records) {
+    if (record.row == nullptr) continue;
     anyKnown = true;
-    const ksp::SummaryField* const field = ksp::findByKey<ksp::kSummaryFields>(record.key);
+    const ksp::SummaryField* const field = ksp::findSummaryField(record.key);
     if (field == nullptr && record.key != ksp::kReadCountHisto) continue;
-    findCount(capture, record, *known);
-    if (record.isEmpty()) continue;
-    const ksp::Elements elements = record.elements(known->count);
-    countOfKey[record.key] = elements.count;
-    for (uint32_t i = 0; field == nullptr && i < elements.count; ++i) summary.readCountHisto[i] = elements[i];
+    findSize(capture, record, "value");
+    if (!record.counts) continue;
+    const ksp::Elements& elements = record.elements;
+    countOfKey[record.key] = elements.size();
+    for (uint32_t i = 0; field == nullptr && i < elements.size(); ++i) {
+      summary.readCountHisto[i] = elements[i];
+    }
     if (field == nullptr) continue;
     field->store(summary, elements[0]);
     if (field->load(summary) != elements[0]) {
-      capture.find(record.offset, std::string(known->name) + "(" + to_string(record.key) + ") is " +
+      capture.find(record.offset, std::string(record.row->name) + "(" + to_string(record.key) + ") is " +
                                       to_string(elements[0]) + ", of which the summary keeps 32 bits");
     }
   }
-  findEnd(capture, walk.end(), record);
+  findStatsEnd(capture, records.ending());
   findKind(capture, anyKnown);
 
   Collector collector(capture, decoding);
   for (const auto& [key, count] : countOfKey) {
-    const ksp::SummaryField* const field = ksp::findByKey<ksp::kSummaryFields>(key);
+    const ksp::SummaryField* const field = ksp::findSummaryField(key);
     collector.add(0, key, ksp::findStatsKey(key)->name, field == nullptr, count, [&](uint32_t i) {
       return field == nullptr ? summary.readCountHisto[i] : field->load(summary);
     });
@@ -147,35 +141,19 @@ void decodeSummary(Capture& capture, const unsigned char* bytes, const Decoding&
 }
 
 void decodeMedia(Capture& capture, const unsigned char* bytes, const Decoding& decoding) {
-  using End = ksp::MSPEnd;
   Collector collector(capture, decoding);
   bool anyKnown = false;
-  ksp::MSPWalk walk(bytes, static_cast<uint32_t>(capture.bytes));
-  ksp::MSPRecord record;
-  while (walk.next(record)) {
-    const ksp::MSPKeyEntry* const known = ksp::LookupMSPKey(record.key);
-    if (known == nullptr) {
-      if (!record.isEmpty() && !record.isFiller()) collector.passOver();
+  ksp::MediaRecords records(bytes, capture.bytes);
+  for (const ksp::Record& record : records) {
+    if (record.row == nullptr) {
+      if (record.counts) collector.passOver();
       continue;
     }
     anyKnown = true;
-    const uint32_t configured = uint32_t{known->count} * known->width;
-    if (record.length != configured) {
-      findSize(capture, record.offset, known->name, record.key, record.length, configured, "byte");
-    }
-    const ksp::Elements elements = {record.value, known->width,
-                                    std::min<uint32_t>(record.length / known->width, known->count)};
-    if (elements.count == 0) continue;
-    collector.add(record.offset, record.key, known->name, known->count > 1, elements);
+    findSize(capture, record, "byte");
+    if (!record.elements.empty()) collector.add(record);
   }
-  const uint64_t left = capture.bytes - record.offset;
-  if (walk.end() == End::kTruncatedHeader) {
-    capture.find(record.offset, counted(left, "byte") + " left over, fewer than a record's header");
-  } else if (walk.end() == End::kOverrun) {
-    capture.find(record.offset, "key " + to_string(record.key) + " announces " +
-                                    counted(record.length, "byte") + ", but the capture ends after " +
-                                    to_string(left - ksp::kMSPHeaderSize));
-  }
+  findEnd(capture, records.ending(), "record's header", ksp::MediaRecords::kHeaderSize, "byte", 1);
   findKind(capture, anyKnown);
 }
 

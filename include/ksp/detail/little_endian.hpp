@@ -1,4 +1,5 @@
-#pragma once
+#ifndef KSP_DETAIL_LITTLE_ENDIAN_HPP
+#define KSP_DETAIL_LITTLE_ENDIAN_HPP
 
 #include <bit>
 #include <cstddef>
@@ -27,4 +28,12 @@ inline uint64_t loadLittleEndian(const unsigned char* bytes, size_t width) {
   return value;
 }
 
+/// Reads an unsigned little-endian integer as wide as `Number`.
+template <class Number>
+Number loadLittleEndian(const unsigned char* bytes) {
+  return static_cast<Number>(loadLittleEndian(bytes, sizeof(Number)));
+}
+
 }  // namespace ksp
+
+#endif

@@ -1,9 +1,13 @@
-#pragma once
+#ifndef KSP_SUMMARY_HPP
+#define KSP_SUMMARY_HPP
+
+/* Which statistics the summary block of a `KSPParseContext` copies. */
 
 #include <cstdint>
 #include <type_traits>
 
 #include "ksp/context.h"
+#include "ksp/detail/key_index.hpp"
 
 namespace ksp {
 
@@ -51,4 +55,11 @@ inline constexpr SummaryField kSummaryFields[] = {
 inline constexpr uint32_t kReadCountHisto = 265;
 inline constexpr uint32_t kReadCounts = std::extent_v<decltype(KSPParseContext::readCountHisto)>;
 
+/// Returns the field that copies the single-valued statistic of `key`, or null.
+inline const SummaryField* findSummaryField(uint32_t key) {
+  return findByKey<kSummaryFields>(key);
+}
+
 }  // namespace ksp
+
+#endif

@@ -1,4 +1,5 @@
-#pragma once
+#ifndef KSP_DETAIL_KEY_INDEX_HPP
+#define KSP_DETAIL_KEY_INDEX_HPP
 
 #include <algorithm>
 #include <array>
@@ -29,3 +30,5 @@ auto findByKey(uint32_t key) -> decltype(std::data(rows)) {
 }
 
 }  // namespace ksp
+
+#endif

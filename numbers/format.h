@@ -8,15 +8,9 @@
 #include <cstring>
 #include <string_view>
 
-#include "context/decimal.h"
-#include "context/little_endian.h"
+#include "ksp/detail/decimal.hpp"
 
 namespace ksp {
-
-/// Reads an unsigned little-endian word; `bytes` needs no alignment.
-inline uint32_t loadWord(const uint8_t* bytes) {
-  return static_cast<uint32_t>(loadLittleEndian(bytes, 4));
-}
 
 /// How a number is shown: a short text in front, then the digits, right-aligned in at least `width` columns.
 struct NumberFormat {

@@ -1,4 +1,5 @@
-#pragma once
+#ifndef KSP_DETAIL_DECIMAL_HPP
+#define KSP_DETAIL_DECIMAL_HPP
 
 #include <bit>
 #include <cstddef>
@@ -69,3 +70,5 @@ inline char* writeDecimal(char* text, uint64_t number) {
 }
 
 }  // namespace ksp
+
+#endif
