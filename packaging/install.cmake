@@ -43,6 +43,8 @@ install(FILES docs/man/kspdump.1 DESTINATION ${CMAKE_INSTALL_MANDIR}/man1 COMPON
 install(FILES docs/man/libksp.3 DESTINATION ${CMAKE_INSTALL_MANDIR}/man3 COMPONENT libksp-dev)
 install(DIRECTORY examples/hosts DESTINATION ${CMAKE_INSTALL_DOCDIR}/examples COMPONENT brellium)
 install(FILES docs/formats.md docs/fleet.md DESTINATION ${CMAKE_INSTALL_DOCDIR} COMPONENT kspdump)
+install(DIRECTORY examples/cluster DESTINATION ${CMAKE_INSTALL_DOCDIR}/examples COMPONENT kspdump
+        USE_SOURCE_PERMISSIONS PATTERN __pycache__ EXCLUDE)
 install(FILES packaging/kspdump.bash-completion DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions
         RENAME kspdump COMPONENT kspdump)
 
