@@ -38,6 +38,11 @@ std::string media(uint16_t key, const std::string& value) {
   return numbers<2>({key, value.size()}) + value;
 }
 
+/// A record of a fixed snapshot: its timestamp, and no activity.
+std::string interval(uint64_t time) {
+  return numbers<4>({time}) + std::string(248, '\0');
+}
+
 struct Outcome {
   int status;
   std::string out;
@@ -69,9 +74,9 @@ class Kspdump : public testing::Test {
   const fs::path folder_;
 };
 
-/// hostWrites twice, perHostReads (an array of 2) and an unknown key; then an end marker with rubbish behind.
+/// hostWrites twice, perHostReads (an array of 2) and an unknown key; then an end marker, and zeros.
 const std::string kStats = record(4, {18446744073709551615U}) + record(298, {7, 9}) + record(900, {1}) +
-                           record(4, {5}) + record(0xFFFF, {1}) + "rubbish";
+                           record(4, {5}) + record(0xFFFF, {1}) + std::string(7, '\0');
 
 TEST_F(Kspdump, JsonKeepsEveryRecordInOrderAndExact) {
   write("a \"b\".stats", kStats);
@@ -121,25 +126,28 @@ TEST_F(Kspdump, CsvHasARowAValue) {
             "\"a,b.stats\",stats,298,perHostReads,1,9\n");
 }
 
-TEST_F(Kspdump, OpenMetricsHasEveryMetricOnce) {
+TEST_F(Kspdump, MetricsAreOneFamilyAKind) {
   write("a.media", media(8212, numbers<4>({1, 2, 3, 4})) + media(4096, numbers<4>({5})));
-  write("b\\.media", media(8220, numbers<4>({1, 2, 3, 4, 5, 6, 7})) + media(4096, numbers<4>({6})) +
-                         media(4096, numbers<4>({7})));
-  const Outcome result = run("media --format openmetrics --match '*Tmode*' a.media 'b\\.media'");
+  write("b\\.media", media(4096, numbers<4>({6})) + media(4096, numbers<4>({7})));
+  const Outcome result = run("media --format openmetrics a.media 'b\\.media'");
   EXPECT_EQ(result.out,
-            "# HELP ksp_media_pass_with_tmode_hard The controller's passWithTmodeHard.\n"
-            "# TYPE ksp_media_pass_with_tmode_hard gauge\n"
-            "ksp_media_pass_with_tmode_hard{source=\"a.media\",key=\"4096\"} 5\n"
-            "ksp_media_pass_with_tmode_hard{source=\"b\\\\.media\",key=\"4096\"} 7\n"
+            "ksp_media{source=\"a.media\",key=\"8212\",name=\"open_blocks_hist\",element=\"0\"} 1\n"
+            "ksp_media{source=\"a.media\",key=\"8212\",name=\"open_blocks_hist\",element=\"1\"} 2\n"
+            "ksp_media{source=\"a.media\",key=\"8212\",name=\"open_blocks_hist\",element=\"2\"} 3\n"
+            "ksp_media{source=\"a.media\",key=\"8212\",name=\"open_blocks_hist\",element=\"3\"} 4\n"
+            "ksp_media{source=\"a.media\",key=\"4096\",name=\"passWithTmodeHard\"} 5\n"
+            "ksp_media{source=\"b\\\\.media\",key=\"4096\",name=\"passWithTmodeHard\"} 7\n"
             "# EOF\n");
   EXPECT_EQ(result.err,
-            "kspdump: b\\.media: offset 40: passWithTmodeHard(4096) comes again; its last record stands\n");
+            "kspdump: b\\.media: offset 0: passWithTmodeHard(4096) comes again; its last record stands\n");
   EXPECT_EQ(result.status, 1);
 }
 
 TEST_F(Kspdump, FindingsNameOffsetAndReason) {
-  const std::string sound = record(4, {12});
+  const std::string sound = record(14, {0, 1, 2, 3, 4, 5, 6, 7, 8, 9});
   const std::string value = numbers<4>({5});
+  const std::string soundMedia = media(8212, numbers<4>({1, 2, 3, 4}));
+  const std::string end = record(0xFFFF, {1});
   const struct {
     const char* command;
     std::string bytes;
@@ -147,36 +155,47 @@ TEST_F(Kspdump, FindingsNameOffsetAndReason) {
     size_t records;
   } cases[] = {
       {"stats", "", "offset 0: the capture is empty", 0},
-      {"stats", sound + "abc", "offset 16: 3 bytes left over, fewer than a word", 1},
-      {"stats", sound + numbers<4>({5, 3}) + sound,
-       "offset 16: key 5 announces 3 values, but the capture ends after 2", 1},
-      {"stats", sound + numbers<4>({0x30000001, 1}) + sound,
-       "offset 16: key 805306369 is invalid, so the rest cannot be read", 1},
-      {"stats", sound + record(14, {1, 2}),
-       "offset 16: hostWriteLogHisto(14) carries 2 values, 10 configured", 2},
-      {"stats", sound + numbers<4>({5, 0}), "offset 16: hostWritesDyn(5) carries 0 values, 1 configured", 1},
-      {"stats", std::string(64, '\0'),
-       "offset 0: there is no known statistic in it: is it a statistics capture?", 0},
+      {"stats", sound + "abc", "offset 88: 3 bytes left over, fewer than a word", 1},
+      {"stats", sound + numbers<4>({5, 3}) + sound.substr(0, 16),
+       "offset 88: key 5 announces 3 values, but the capture ends after 2", 1},
+      {"stats", sound + numbers<4>({0x30000001, 1}) + sound.substr(0, 16),
+       "offset 88: key 805306369 is invalid, so the rest cannot be read", 1},
+      {"stats", sound + record(15, {1, 2}), "offset 88: hostReadLogHisto(15) carries 2 values, 10 configured",
+       2},
+      {"stats", std::string(64, '\0'), "offset 0: there is nothing in it but zeros", 0},
+      {"stats", sound + end + std::string(9, '\0') + sound.substr(0, 40),
+       "offset 113: 40 bytes behind the end marker that are not all zeros, and not read", 1},
+      {"stats", sound + numbers<4>({0xFFFF, 3}) + sound.substr(0, 16),
+       "offset 96: 16 bytes behind the end marker that are not all zeros, and not read", 1},
+      {"stats", media(4096, numbers<4>({0})), "offset 0: looks like media statistics, 100 % recognised", 0},
+      {"stats", record(900, {1}), "offset 0: does not look like statistics: 0 % recognised", 1},
       {"summary", sound + numbers<4>({5, 3}),
-       "offset 16: key 5 announces 3 values, but the capture ends after 0", 1},
-      {"media", media(4096, value) + "abc", "offset 8: 3 bytes left over, fewer than a record's header", 1},
-      {"media", media(4096, value) + numbers<2>({4097, 4}),
-       "offset 8: key 4097 announces 4 bytes, but the capture ends after 0", 1},
+       "offset 88: key 5 announces 3 values, but the capture ends after 0", 0},
+      {"media", soundMedia + "abc", "offset 20: 3 bytes left over, fewer than a record's header", 1},
+      {"media", soundMedia + numbers<2>({4097, 4}),
+       "offset 20: key 4097 announces 4 bytes, but the capture ends after 0", 1},
       {"media", media(4096, value + "a"), "offset 0: passWithTmodeHard(4096) carries 5 bytes, 4 configured",
        1},
       {"media", media(4096, value.substr(1)),
        "offset 0: passWithTmodeHard(4096) carries 3 bytes, 4 configured", 0},
-      {"media", media(9, value),
-       "offset 0: there is no known statistic in it: is it a media statistics capture?", 0},
-      {"snapshot", std::string(504, '\0'), "offset 0: no record has a timestamp: is it a snapshot capture?",
-       52},
-      {"snapshot", std::string(253, '\1'), "offset 252: 1 byte left over, fewer than a record", 26},
+      {"media", soundMedia + media(9, value + "ab"),
+       "offset 20: Media_9(9) carries 6 bytes, of which the last 2 fill no element of 4", 2},
+      {"media", soundMedia + media(0x2FFF, value) + "\1",
+       "offset 28: 1 byte behind the end record that are not all zeros, and not read", 1},
+      {"media", sound, "offset 0: looks like statistics, 100 % recognised", 0},
+      {"snapshot", std::string(504, '\0'), "offset 0: there is nothing in it but zeros", 52},
+      {"snapshot", interval(1) + "\1", "offset 252: 1 byte left over, fewer than a record", 26},
+      {"snapshot", interval(1) + interval(2) + interval(4) + interval(3) + interval(2),
+       "offset 1008: the timestamps fall 2 times, those of a snapshot once at most", 130},
   };
   for (const auto& [command, bytes, finding, records] : cases) {
     write("x", bytes);
     const Outcome result = run(std::string(command) + " --format json x");
     EXPECT_EQ(result.status, 1);
-    EXPECT_EQ(result.err, "kspdump: x: " + finding + "\n");
+    EXPECT_EQ(result.err, "") << "findings stand once";
+    EXPECT_EQ(run(std::string(command) + " --format csv x").err, "kspdump: x: " + finding + "\n");
+    const std::string table = run(std::string(command) + " --format table x").out;
+    EXPECT_TRUE(table.ends_with("! " + finding + "\n")) << table;
     const json document = json::parse(result.out);
     EXPECT_EQ(document["records"].size(), records) << finding;
     ASSERT_EQ(document["findings"].size(), 1u);
@@ -260,9 +279,11 @@ TEST_F(Kspdump, AHeadersSnapshotLosesNoLineAtTheEndOfAPage) {
 TEST_F(Kspdump, DiffTellsWhatChanged) {
   write("old", record(4, {18446744073709551615U}) + record(298, {7, 9}) + record(5, {1}) + record(5, {2}));
   write("new", record(5, {1}) + record(5, {3}) + record(4, {0}) + record(298, {7, 10}) + record(900, {4}));
-  EXPECT_EQ(json::parse(run("diff stats --format json old new").out)["changes"],
-            json::parse(R"([{"key":5,"name":"hostWritesDyn","old":[2],"new":[3],"delta":[1]},
-              {"key":4,"name":"hostWrites","old":[18446744073709551615],"new":[0],"delta":[-18446744073709551615]},
+  EXPECT_EQ(
+      json::parse(run("diff stats --format json old new").out)["changes"],
+      json::parse(
+          R"([{"key":4,"name":"hostWrites","old":[18446744073709551615],"new":[0],"delta":[-18446744073709551615]},
+              {"key":5,"name":"hostWritesDyn","old":[2],"new":[3],"delta":[1]},
               {"key":298,"name":"perHostReads","old":[7,9],"new":[7,10],"delta":[0,1]},
               {"key":900,"name":"Stat_900","old":[null],"new":[4],"delta":[null]}])"));
   EXPECT_EQ(run("diff stats --match 'hostW*s' --format csv old new").out,
@@ -311,16 +332,16 @@ TEST_F(Kspdump, WrongUsageEndsWithTwo) {
 
 TEST_F(Kspdump, NamesStandForThemselves) {
   write("[a]", "");
-  EXPECT_EQ(run("stats '[a]'").err, "kspdump: ./[a]: offset 0: the capture is empty\n");
+  EXPECT_EQ(run("stats --format csv '[a]'").err, "kspdump: ./[a]: offset 0: the capture is empty\n");
   write("\xC3\xA4\xFF\x9B", "");
   const Outcome named = shell("LC_ALL=C.UTF-8 $KSPDUMP stats --format json *'\xFF'*");
-  EXPECT_EQ(named.err, "kspdump: \xC3\xA4\\xff\\x9b: offset 0: the capture is empty\n");
   EXPECT_EQ(json::parse(named.out)["source"], "\xC3\xA4\\xff\\x9b");
 }
 
 TEST_F(Kspdump, NamesCannotSteerTheTerminal) {
   write("a\x1b[2J\n.stats", "");
-  EXPECT_EQ(run("stats a*").err, "kspdump: a\\x1b[2J\\x0a.stats: offset 0: the capture is empty\n");
+  EXPECT_EQ(run("stats --format csv a*").err,
+            "kspdump: a\\x1b[2J\\x0a.stats: offset 0: the capture is empty\n");
 }
 
 TEST_F(Kspdump, ExamplesAreWhatTheirGeneratorMakes) {

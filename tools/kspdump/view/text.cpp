@@ -1,4 +1,4 @@
-#include "tools/kspdump/text.h"
+#include "tools/kspdump/view/text.h"
 
 #include <langinfo.h>
 
@@ -6,23 +6,6 @@
 #include <nlohmann/json.hpp>
 
 namespace kspdump {
-
-void appendNumber(std::string& out, Wide number) {
-  char digits[48];
-  char* first = digits + sizeof digits;
-  const bool negative = number < 0;
-  do {
-    const int digit = static_cast<int>(number % 10);
-    *--first = static_cast<char>('0' + (negative ? -digit : digit));
-    number /= 10;
-  } while (number != 0);
-  if (negative) *--first = '-';
-  out.append(first, digits + sizeof digits);
-}
-
-std::string counted(uint64_t count, const char* noun) {
-  return std::to_string(count) + " " + noun + (count == 1 ? "" : "s");
-}
 
 namespace {
 
@@ -91,8 +74,12 @@ std::string utf8(std::string_view text) {
   return spelledOutUnless(text, [](uint32_t character) { return character <= 0x10FFFF; });
 }
 
+bool isPlainJson(std::string_view text) {
+  return isPlain(text) && text.find_first_of("\"\\") == std::string_view::npos;
+}
+
 void appendJson(std::string& out, std::string_view text) {
-  if (isPlain(text) && text.find_first_of("\"\\") == std::string_view::npos) {
+  if (isPlainJson(text)) {
     out.append("\"").append(text).append("\"");
   } else {
     out += nlohmann::json(utf8(text)).dump();

@@ -1,4 +1,4 @@
-#include "tools/kspdump/capture.h"
+#include "tools/kspdump/source/source.h"
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -13,7 +13,6 @@ namespace kspdump {
 
 namespace {
 
-constexpr size_t kMostFindings = 100;
 /// The parsers take lengths of 32 bits.
 constexpr size_t kGreatestCapture = std::numeric_limits<uint32_t>::max();
 constexpr size_t kLeastRead = size_t{1} << 16;
@@ -35,43 +34,6 @@ class Descriptor {
 };
 
 }  // namespace
-
-std::string_view kindName(Kind kind) {
-  constexpr std::string_view kNames[] = {"stats", "summary", "media", "snapshot"};
-  return kNames[static_cast<size_t>(kind)];
-}
-
-std::string_view kindTitle(Kind kind) {
-  constexpr std::string_view kTitles[] = {"statistics", "statistics summary", "media statistics", "snapshot"};
-  return kTitles[static_cast<size_t>(kind)];
-}
-
-void Capture::clear() {
-  recordCount = 0;
-  records.clear();
-  values.clear();
-  findings.clear();
-  furtherFindings = 0;
-  labels.clear();
-}
-
-void Capture::find(uint64_t offset, std::string reason) {
-  if (findings.size() < kMostFindings) {
-    findings.push_back({offset, std::move(reason)});
-  } else {
-    ++furtherFindings;
-  }
-}
-
-Wide Capture::sum(const Record& record) const {
-  Wide sum = 0;
-  for (size_t i = 0; i < record.valueCount; ++i) sum += valuesOf(record)[i];
-  return sum;
-}
-
-std::string recordName(const Record& record) {
-  return record.name.empty() ? "Stat_" + std::to_string(record.key) : std::string(record.name);
-}
 
 std::string readFile(const std::string& path, std::vector<unsigned char>& bytes) {
   bytes.clear();

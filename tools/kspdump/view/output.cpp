@@ -1,4 +1,4 @@
-#include "tools/kspdump/output.h"
+#include "tools/kspdump/view/output.h"
 
 #include <fcntl.h>
 #include <poll.h>
@@ -12,7 +12,7 @@
 #include <cstdlib>
 #include <system_error>
 
-#include "tools/kspdump/text.h"
+#include "tools/kspdump/view/text.h"
 
 namespace kspdump {
 

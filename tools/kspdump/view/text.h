@@ -8,20 +8,23 @@
 #include <string>
 #include <string_view>
 
-#include "tools/kspdump/capture.h"
+#include "tools/kspdump/view/view.h"
 
 namespace kspdump {
 
-/// Appends small pieces by way of a buffer, the last of them with `flush`.
+/// Appends small pieces to a view's text by way of a buffer.
 class Appender {
  public:
-  explicit Appender(std::string& out) : out_(out) {}
+  explicit Appender(Sink& sink) : sink_(sink) {}
+  Appender(const Appender&) = delete;
+  Appender& operator=(const Appender&) = delete;
+  ~Appender() { sink_.text.append(buffer_, at_); }
 
   void text(std::string_view piece) {
     if (piece.size() > static_cast<size_t>(std::end(buffer_) - at_)) {
       flush();
       if (piece.size() > sizeof buffer_) {
-        out_ += piece;
+        sink_.text += piece;
         return;
       }
     }
@@ -34,13 +37,14 @@ class Appender {
     at_ = std::to_chars(at_, std::end(buffer_), number).ptr;
   }
 
+ private:
   void flush() {
-    out_.append(buffer_, at_);
+    sink_.text.append(buffer_, at_);
     at_ = buffer_;
+    sink_.offer();
   }
 
- private:
-  std::string& out_;
+  Sink& sink_;
   char buffer_[4096];
   char* at_ = buffer_;
 };
@@ -51,13 +55,12 @@ void appendNumber(std::string& out, Number number) {
   char digits[24];
   out.append(digits, std::to_chars(digits, digits + sizeof digits, number).ptr);
 }
-void appendNumber(std::string& out, Wide number);
-
-/// "1 byte", "2 bytes".
-std::string counted(uint64_t count, const char* noun);
 
 /// A text as UTF-8; each byte that is not is spelled out as in \xff.
 std::string utf8(std::string_view text);
+
+/// Whether a text is a JSON string as it stands.
+bool isPlainJson(std::string_view text);
 
 /// Appends a text as a JSON string, and as UTF-8.
 void appendJson(std::string& out, std::string_view text);

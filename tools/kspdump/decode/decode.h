@@ -1,0 +1,69 @@
+#pragma once
+
+#include <array>
+#include <functional>
+#include <span>
+#include <string>
+
+#include "tools/kspdump/decode/capture.h"
+
+namespace kspdump {
+
+/// What to decode a capture as, and which of its records to hand on.
+struct Decoding {
+  Kind kind = Kind::kStats;
+  /// Name statistics by their key number.
+  bool byNumber = false;
+  /// Shell pattern that a record's name must match; empty keeps all.
+  std::string match;
+  /// The snapshot's header; empty for the fixed layout.
+  Bytes header;
+};
+
+/// Takes some of a capture's records, in their order; they are gone when it returns.
+using TakeRecords = std::function<void(std::span<const Record>)>;
+
+/// Decodes `capture.bytes` as far as they go, hands the selected records to `take`, some at a time, and names
+/// whatever is wrong with them in the capture.
+void decode(const Decoding& decoding, Capture& capture, const TakeRecords& take);
+
+/// Counts and selects records, and hands them on some at a time.
+class Collector {
+ public:
+  Collector(Capture& capture, const Decoding& decoding, const TakeRecords& take)
+      : capture_(capture), decoding_(decoding), take_(take) {}
+  Collector(const Collector&) = delete;
+  Collector& operator=(const Collector&) = delete;
+
+  /// A record whose name lasts.
+  void add(uint64_t offset, uint32_t key, std::string_view name, bool isArray, const Values& values);
+
+  /// A record that is named by its key: `prefix`, of a few characters, and the number.
+  void addNumbered(uint64_t offset, uint32_t key, std::string_view prefix, bool isArray,
+                   const Values& values);
+
+  /// Counts a record that is not shown.
+  void passOver() { ++capture_.recordCount; }
+
+  /// Hands on the last records.
+  void finish();
+
+ private:
+  static constexpr size_t kBatch = 256;
+  static constexpr size_t kLongestNumbered = 24;
+
+  Capture& capture_;
+  const Decoding& decoding_;
+  const TakeRecords& take_;
+  size_t count_ = 0;
+  std::array<Record, kBatch> records_;
+  std::array<char[kLongestNumbered], kBatch> names_;
+};
+
+/// A decoder for each kind; `decode` chooses.
+void decodeStats(const Decoding& decoding, Capture& capture, Collector& collector);
+void decodeSummary(const Decoding& decoding, Capture& capture, Collector& collector);
+void decodeMedia(const Decoding& decoding, Capture& capture, Collector& collector);
+void decodeSnapshot(const Decoding& decoding, Capture& capture, Collector& collector);
+
+}  // namespace kspdump

@@ -1,0 +1,32 @@
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "tools/kspdump/decode/decode.h"
+#include "tools/kspdump/view/view.h"
+
+namespace kspdump {
+
+/// Exit statuses; the greatest that applies is the program's.
+enum Status : int { kClean = 0, kFindings = 1, kUsage = 2, kUnreadable = 3 };
+
+/// What the command line asks for.
+struct Options {
+  Subject subject = Subject::kStatistics;
+  const Form* form = nullptr;
+  Decoding decoding;
+  /// Files, or "-" for standard input.
+  std::vector<std::string> sources;
+  /// File of the snapshot's header; empty for none.
+  std::string header;
+  /// File to write to; empty for standard output.
+  std::string output;
+  /// Captures decoded at a time.
+  size_t jobs = 1;
+};
+
+/// Does what is asked for. Returns the exit status; throws std::exception where nothing more can be done.
+int run(const Options& options);
+
+}  // namespace kspdump

@@ -1,0 +1,95 @@
+#pragma once
+
+#include <cstdint>
+#include <map>
+#include <optional>
+#include <span>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "tools/kspdump/decode/capture.h"
+#include "tools/kspdump/series/wide.h"
+
+namespace kspdump {
+
+/// A statistic, or a field of a snapshot, over the points of a series.
+struct Track {
+  /// Of a snapshot's field, its place.
+  uint32_t key;
+  std::string name;
+  /// An array at one point at least.
+  bool isArray;
+  /// The most that it has at a point.
+  uint32_t elements;
+};
+
+/// Points in a row, each a set of named values: captures in the order given, or the intervals of a snapshot.
+///
+/// It is filled as a view is: `begin`, `records`, `end` for each capture. The k-th record of a key belongs to
+/// the k-th of that key at the other points. The values of captures are copied; those of a snapshot's
+/// intervals stay where they are, so the bytes of its capture outlive the series.
+class Series {
+ public:
+  void begin(const Capture& capture);
+  void records(std::span<const Record> records);
+  void end(const Capture& capture);
+
+  [[nodiscard]] Kind kind() const { return captures_.front().kind; }
+  /// What was read, with its findings: a capture a point or, of a snapshot, one for all points.
+  [[nodiscard]] const std::vector<Capture>& captures() const { return captures_; }
+
+  [[nodiscard]] size_t points() const { return isSnapshot_ ? intervals_.size() : captures_.size(); }
+  /// The number that a snapshot's record has at a point.
+  [[nodiscard]] uint32_t recordNumber(size_t point) const { return intervals_[point].number; }
+
+  /// In the order in which they came first.
+  [[nodiscard]] const std::vector<Track>& tracks() const { return tracks_; }
+  /// The tracks' indices in ascending order of keys.
+  [[nodiscard]] std::vector<size_t> tracksInOrder() const;
+
+  /// The values of a track at a point; empty where it has none.
+  [[nodiscard]] Values values(size_t track, size_t point) const;
+  /// One of these; none where the track has none there.
+  [[nodiscard]] std::optional<uint64_t> value(size_t track, size_t point, uint32_t element) const;
+  /// Of all elements; none where the track has no value there.
+  [[nodiscard]] std::optional<Wide> sum(size_t track, size_t point) const;
+  /// What an element grew by from the first point to the last; none where it is missing at one.
+  [[nodiscard]] std::optional<Wide> delta(size_t track, uint32_t element) const;
+  /// Whether a track has not the same values at all points.
+  [[nodiscard]] bool changes(size_t track) const;
+
+ private:
+  /// Where a capture's values lie in the copy.
+  struct Cell {
+    size_t first = 0;
+    uint32_t count = 0;
+    uint8_t width = 0;
+  };
+  struct Interval {
+    uint64_t offset;
+    uint32_t number;
+  };
+
+  void addInterval(const Record& record);
+  size_t trackOf(const Record& record);
+
+  bool isSnapshot_ = false;
+  std::vector<Capture> captures_;
+  std::vector<Track> tracks_;
+
+  // Of captures, a copy of values each and a row of cells each.
+  std::vector<std::vector<unsigned char>> copies_;
+  std::vector<std::vector<Cell>> cells_;
+  std::map<std::pair<uint32_t, size_t>, size_t> trackOfKey_;
+  std::map<uint32_t, size_t> seen_;
+
+  // Of a snapshot, the fields of the first interval; the others' lie at the same distance.
+  std::vector<Values> fields_;
+  std::vector<Interval> intervals_;
+};
+
+/// The sum of a record's values.
+Wide sum(const Values& values);
+
+}  // namespace kspdump

@@ -1,0 +1,48 @@
+#include "tools/kspdump/view/forms.h"
+
+#include <algorithm>
+#include <iterator>
+
+namespace kspdump {
+
+namespace {
+
+using enum Subject;
+
+/// A subject's first form is the one it is shown in where none is asked for.
+const Form kForms[] = {
+    {"report", makeReport, {kSnapshot}},
+    {"table", makeTable, {kStatistics, kSnapshot, kDifference}},
+    {"json", makeJson, {kStatistics, kSnapshot, kDifference}},
+    {"csv", makeCsv, {kStatistics, kSnapshot, kDifference}},
+    {"openmetrics", makeMetrics, {kStatistics, kSnapshot}},
+};
+
+}  // namespace
+
+std::vector<const Form*> formsFor(Subject subject) {
+  std::vector<const Form*> forms;
+  for (const Form& form : kForms) {
+    if (std::find(form.shows.begin(), form.shows.end(), subject) != form.shows.end()) forms.push_back(&form);
+  }
+  return forms;
+}
+
+const Form* findForm(std::string_view name, Subject subject) {
+  for (const Form* form : formsFor(subject)) {
+    if (form->name == name) return form;
+  }
+  return nullptr;
+}
+
+void show(const Decoding& decoding, Capture& capture, View& view) {
+  capture.kind = decoding.kind;
+  if (view.measures(capture)) {
+    decode(decoding, capture, [&](std::span<const Record> records) { view.measure(records); });
+  }
+  view.begin(capture);
+  decode(decoding, capture, [&](std::span<const Record> records) { view.records(records); });
+  view.end(capture);
+}
+
+}  // namespace kspdump

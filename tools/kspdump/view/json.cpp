@@ -1,0 +1,129 @@
+// JSON: a document a line and a capture, or one for a difference.
+
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "tools/kspdump/view/forms.h"
+#include "tools/kspdump/view/text.h"
+
+namespace kspdump {
+
+namespace {
+
+void appendFindings(std::string& out, std::string_view member, const Capture& capture) {
+  out.append("\"").append(member).append("\":[");
+  for (const Finding& finding : capture.findings) {
+    if (&finding != capture.findings.data()) out += ',';
+    out += "{\"offset\":";
+    appendNumber(out, finding.offset);
+    out += ",\"reason\":";
+    appendJson(out, finding.reason);
+    out += '}';
+  }
+  out += ']';
+  if (capture.furtherFindings != 0) {
+    out.append(",\"further_").append(member).append("\":");
+    appendNumber(out, capture.furtherFindings);
+  }
+}
+
+template <class ValueAt>
+void appendList(std::string& out, const char* member, uint32_t count, ValueAt valueAt) {
+  out.append(",\"").append(member).append("\":[");
+  for (uint32_t i = 0; i < count; ++i) {
+    const auto value = valueAt(i);
+    out.append(i == 0 ? "" : ",").append(value ? Wide(*value).text() : "null");
+  }
+  out += ']';
+}
+
+class Json : public View {
+ public:
+  using View::View;
+
+  void begin(Capture& capture) override {
+    hasRecords_ = false;
+    std::string& out = sink_.text;
+    out += "{\"source\":";
+    appendJson(out, capture.source);
+    out.append(",\"kind\":\"").append(kindName(capture.kind)).append("\",\"bytes\":");
+    appendNumber(out, capture.bytes.size());
+    out += ",\"records\":[";
+  }
+
+  void records(std::span<const Record> records) override {
+    Appender appender(sink_);
+    for (const Record& record : records) {
+      appender.text(hasRecords_ ? ",{\"key\":" : "{\"key\":");
+      hasRecords_ = true;
+      appender.number(record.key);
+      appender.text(",\"name\":");
+      if (isPlainJson(record.name)) {
+        appender.text("\"");
+        appender.text(record.name);
+        appender.text("\"");
+      } else {
+        std::string name;
+        appendJson(name, record.name);
+        appender.text(name);
+      }
+      appender.text(",\"values\":[");
+      for (uint32_t i = 0; i < record.values.size(); ++i) {
+        if (i != 0) appender.text(",");
+        appender.number(record.values[i]);
+      }
+      appender.text("]}");
+    }
+  }
+
+  void end(Capture& capture) override {
+    sink_.text += "],";
+    appendFindings(sink_.text, "findings", capture);
+    sink_.text += "}\n";
+  }
+
+  void difference(const Series& series) override {
+    const Capture& before = series.captures().front();
+    const Capture& after = series.captures().back();
+    std::string& out = sink_.text;
+    out += "{\"old\":";
+    appendJson(out, before.source);
+    out += ",\"new\":";
+    appendJson(out, after.source);
+    out.append(",\"kind\":\"").append(kindName(series.kind())).append("\",\"changes\":[");
+    const char* separator = "";
+    for (const size_t track : series.tracksInOrder()) {
+      if (!series.changes(track)) continue;
+      const Track& about = series.tracks()[track];
+      out.append(separator).append("{\"key\":");
+      separator = ",";
+      appendNumber(out, about.key);
+      out += ",\"name\":";
+      appendJson(out, about.name);
+      appendList(out, "old", about.elements, [&](uint32_t i) { return series.value(track, 0, i); });
+      appendList(out, "new", about.elements, [&](uint32_t i) { return series.value(track, 1, i); });
+      appendList(out, "delta", about.elements, [&](uint32_t i) { return series.delta(track, i); });
+      out += '}';
+      sink_.offer();
+    }
+    out += "],";
+    appendFindings(out, "old_findings", before);
+    out += ',';
+    appendFindings(out, "new_findings", after);
+    out += "}\n";
+  }
+
+  [[nodiscard]] bool showsFindings() const override { return true; }
+
+ private:
+  bool hasRecords_ = false;
+};
+
+}  // namespace
+
+std::unique_ptr<View> makeJson(const ViewOptions& /*options*/, Sink& sink) {
+  return std::make_unique<Json>(sink);
+}
+
+}  // namespace kspdump

@@ -1,0 +1,153 @@
+// One exposition for monitoring systems: a metric family a kind, the controller's names as a label.
+
+#include <algorithm>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "tools/kspdump/view/forms.h"
+#include "tools/kspdump/view/text.h"
+
+namespace kspdump {
+
+namespace {
+
+/// A label's value as UTF-8, what would end it escaped.
+std::string escaped(std::string_view text) {
+  std::string out;
+  for (const char c : utf8(text)) {
+    if (c == '\n') {
+      out += "\\n";
+      continue;
+    }
+    if (c == '\\' || c == '"') out += '\\';
+    out += c;
+  }
+  return out;
+}
+
+/// Which record of a key is its last, by the records' places among all.
+class LastOfKeys {
+ public:
+  void clear() {
+    entries_.clear();
+    distinct_ = 0;
+  }
+
+  /// Places ascend.
+  void add(uint32_t key, uint32_t place) {
+    entries_.push_back(uint64_t{key} << 32 | place);
+    if (entries_.size() >= std::max(kSmall, 2 * distinct_)) sort();
+  }
+
+  void sort() {
+    std::sort(entries_.begin(), entries_.end());
+    const auto isSameKey = [](uint64_t a, uint64_t b) { return a >> 32 == b >> 32; };
+    // The last of each key is the first from behind.
+    entries_.erase(entries_.begin(), std::unique(entries_.rbegin(), entries_.rend(), isSameKey).base());
+    distinct_ = entries_.size();
+  }
+
+  /// Behind `sort`.
+  [[nodiscard]] bool isLast(uint32_t key, uint32_t place) const {
+    return std::binary_search(entries_.begin(), entries_.end(), uint64_t{key} << 32 | place);
+  }
+
+ private:
+  static constexpr size_t kSmall = 4096;
+
+  std::vector<uint64_t> entries_;
+  size_t distinct_ = 0;
+};
+
+class Metrics : public View {
+ public:
+  using View::View;
+
+  void tail() override { sink_.text += "# EOF\n"; }
+
+  [[nodiscard]] bool measures(const Capture& capture) const override {
+    return capture.kind != Kind::kSnapshot;
+  }
+
+  void measure(std::span<const Record> records) override {
+    for (const Record& record : records) last_.add(record.key, place_++);
+  }
+
+  void begin(Capture& capture) override {
+    last_.sort();
+    place_ = 0;
+    repeated_.clear();
+    isSnapshot_ = capture.kind == Kind::kSnapshot;
+    // The summary's fields are statistics of that name.
+    const Kind family = capture.kind == Kind::kSummary ? Kind::kStats : capture.kind;
+    front_.assign("ksp_").append(kindName(family)).append("{source=\"").append(escaped(capture.source));
+    interval_.clear();
+  }
+
+  void records(std::span<const Record> records) override {
+    for (const Record& record : records) {
+      if (isSnapshot_) {
+        keepInterval(record);
+      } else if (last_.isLast(record.key, place_++)) {
+        add(record);
+      } else if (repeated_.size() < kMostRepeated) {
+        repeated_.push_back({record.offset, std::string(record.name) + "(" + std::to_string(record.key) +
+                                                ") comes again; its last record stands"});
+      }
+    }
+  }
+
+  void end(Capture& capture) override {
+    for (const Record& record : interval_) add(record);
+    for (Finding& finding : repeated_) capture.find(finding.offset, std::move(finding.reason));
+    last_.clear();
+    place_ = 0;
+  }
+
+  [[nodiscard]] bool showsFindings() const override { return false; }
+
+ private:
+  static constexpr size_t kMostRepeated = 1000;
+
+  /// Of a snapshot the last interval is shown.
+  void keepInterval(const Record& record) {
+    if (!interval_.empty() && interval_.front().key != record.key) interval_.clear();
+    interval_.push_back(record);
+  }
+
+  void add(const Record& record) {
+    Appender appender(sink_);
+    for (uint32_t i = 0; i < record.values.size(); ++i) {
+      appender.text(front_);
+      if (!isSnapshot_) {
+        appender.text("\",key=\"");
+        appender.number(record.key);
+      }
+      appender.text("\",name=\"");
+      appender.text(isSnapshot_ ? escaped(record.name) : record.name);
+      if (record.isArray) {
+        appender.text("\",element=\"");
+        appender.number(i);
+      }
+      appender.text("\"} ");
+      appender.number(record.values[i]);
+      appender.text("\n");
+    }
+  }
+
+  std::string front_;
+  bool isSnapshot_ = false;
+  LastOfKeys last_;
+  uint32_t place_ = 0;
+  std::vector<Finding> repeated_;
+  std::vector<Record> interval_;
+};
+
+}  // namespace
+
+std::unique_ptr<View> makeMetrics(const ViewOptions& /*options*/, Sink& sink) {
+  return std::make_unique<Metrics>(sink);
+}
+
+}  // namespace kspdump

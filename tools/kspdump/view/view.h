@@ -1,0 +1,95 @@
+#pragma once
+
+#include <functional>
+#include <initializer_list>
+#include <memory>
+#include <span>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "tools/kspdump/decode/capture.h"
+#include "tools/kspdump/decode/decode.h"
+#include "tools/kspdump/series/series.h"
+
+namespace kspdump {
+
+/// Where a view puts its text. Whoever made it takes the text from there between two calls of the view;
+/// within a long one, `drain` does, where there is one.
+class Sink {
+ public:
+  std::string text;
+  std::function<void(std::string& text)> drain;
+
+  /// To be called where much may have been added.
+  void offer() {
+    constexpr size_t kMuch = size_t{1} << 16;
+    if (text.size() >= kMuch && drain) drain(text);
+  }
+};
+
+/// How captures, and series of them, are shown. One implementation a form; the caller never asks which one it
+/// has.
+///
+/// Of many captures, several views of one form may show some each: `head`, `between` and `tail` then are
+/// called of one of them, around all captures and between two, and nothing that a view keeps of one capture
+/// may matter to the next.
+class View {
+ public:
+  explicit View(Sink& sink) : sink_(sink) {}
+  View(const View&) = delete;
+  View& operator=(const View&) = delete;
+  virtual ~View() = default;
+
+  virtual void head() {}
+  virtual void between() {}
+  virtual void tail() {}
+
+  /// Whether a capture's records are to come twice: first to `measure`, then, between `begin` and `end`, to
+  /// `records`. The capture has its counts in `begin` only then.
+  [[nodiscard]] virtual bool measures(const Capture& /*capture*/) const { return false; }
+  virtual void measure(std::span<const Record> /*records*/) {}
+
+  virtual void begin(Capture& capture) = 0;
+  virtual void records(std::span<const Record> records) = 0;
+  /// The capture's findings are complete, but for those of the view itself.
+  virtual void end(Capture& capture) = 0;
+
+  /// Shows what changed between a series' two points, or how its values went, instead of captures. A form
+  /// that has none of it is not made for it.
+  virtual void difference(const Series& /*series*/) {}
+  virtual void trend(const Series& /*series*/) {}
+
+  /// Whether what is shown has the findings; where not, the program tells them on standard error.
+  [[nodiscard]] virtual bool showsFindings() const = 0;
+
+ protected:
+  Sink& sink_;
+};
+
+/// How the views show what they show.
+struct ViewOptions {
+  /// Columns that lines are fitted to.
+  size_t width = 80;
+};
+
+/// What a form can be asked to show.
+enum class Subject { kStatistics, kSnapshot, kDifference, kTrend };
+
+/// A form that there is. Another one is a file in this room and a row in `forms.cpp`.
+struct Form {
+  std::string_view name;
+  std::unique_ptr<View> (*make)(const ViewOptions& options, Sink& sink);
+  std::initializer_list<Subject> shows;
+};
+
+/// All forms, or those of a subject.
+std::vector<const Form*> formsFor(Subject subject);
+
+/// The form of this name; null where there is none for the subject.
+const Form* findForm(std::string_view name, Subject subject);
+
+/// Decodes a capture and shows it.
+void show(const Decoding& decoding, Capture& capture, View& view);
+
+}  // namespace kspdump
