@@ -1,4 +1,4 @@
-// The parsers beside two yardsticks: the same appends with printf formatting, and the floor, which only
+// The parsers beside two yardsticks: the plain parsers with printf formatting, and the floor, which only
 // allocates, links and frees the nodes that the parser would have filled.
 
 #include <algorithm>
@@ -14,6 +14,8 @@
 #include "ksp/entries.hpp"
 #include "ksp/ksp.h"
 #include "ksp/records.hpp"
+#include "tests/context_check.h"
+#include "tests/plain_parsers.h"
 
 namespace {
 
@@ -73,7 +75,7 @@ NameValueNode* newNode() {
 }
 
 template <Nodes nodes>
-void plainAppend(GenericParserContext& context, const char* prefix, const char* name, uint64_t value) {
+void appendByPrintf(GenericParserContext& context, const char* prefix, const char* name, uint64_t value) {
   NameValueNode* const valueNode = newNode<nodes>();
   NameValueNode* const nameNode = newNode<nodes>();
   if (valueNode == nullptr || nameNode == nullptr) std::abort();
@@ -86,41 +88,15 @@ void plainAppend(GenericParserContext& context, const char* prefix, const char* 
   link(context, nameNode, valueNode);
 }
 
-template <Nodes nodes>
-void plainAppend(GenericParserContext& context, const char* name, const ksp::Elements& elements) {
-  if (elements.size() == 1) return plainAppend<nodes>(context, "", name, elements[0]);
-  for (uint32_t i = 0; i < elements.size(); ++i) {
-    char index[16];
-    static_cast<void>(std::snprintf(index, sizeof index, "%d", static_cast<int>(i)));
-    plainAppend<nodes>(context, name, index, elements[i]);
-  }
-}
-
-void plainGeneric(GenericParserContext* context, const void* stream, uint32_t length) {
-  ksp::StatisticsRecords records(stream, length);
-  for (const ksp::Record& record : records) {
-    if (record.row == nullptr) continue;
-    char name[KSPNodeTextSize];
-    static_cast<void>(
-        std::snprintf(name, sizeof name, record.isArray ? "%s_" : "%s", record.row->name.data()));
-    plainAppend<Nodes::kZeroed>(*context, name, record.elements);
-  }
-}
-
-void plainLegacy(KSPParseContext* context, const void* stream, uint32_t length) {
-  ksp::StatisticsRecords records(stream, length, ksp::StatisticsFraming::kUnmarked);
-  for (const ksp::Record& record : records) {
-    if (record.row == nullptr) continue;
-    plainAppend<Nodes::kPlain>(context->entries, record.row->name.data(), record.elements);
-  }
-}
-
-void plainMedia(GenericParserContext* context, const void* stream, uint32_t length) {
-  ksp::MediaRecords records(stream, length);
-  for (const ksp::Record& record : records) {
-    if (record.row == nullptr) continue;
-    plainAppend<Nodes::kZeroed>(*context, record.row->name.data(), record.elements);
-  }
+/// A plain parser with the signature of the library's.
+template <Nodes nodes, class Plain>
+auto intoNodes(Plain plain) {
+  return [=](auto* context, const unsigned char* stream, uint32_t length) {
+    const auto append = [&](const char* prefix, const char* name, uint64_t value) {
+      appendByPrintf<nodes>(ksp::test::listsOf(*context), prefix, name, value);
+    };
+    return plain(*context, stream, length, append);
+  };
 }
 
 template <class Parse, class Owner>
@@ -151,16 +127,12 @@ void measureFloor(benchmark::State& state, std::ptrdiff_t entries) {
 /// Registers GROUP/library, GROUP/plain and GROUP/floor.
 template <class Context, Nodes nodes, class Library, class Plain>
 void group(const std::string& name, const Bytes& stream, Library library, Plain plain) {
+  const auto length = static_cast<uint32_t>(stream.size());
+  Context filled;
+  library(filled.get(), stream.data(), length);
+  const auto entries = std::ranges::distance(ksp::entries(filled));
   // Only the same work is worth comparing.
-  Context expected;
-  Context found;
-  plain(expected.get(), stream.data(), static_cast<uint32_t>(stream.size()));
-  library(found.get(), stream.data(), static_cast<uint32_t>(stream.size()));
-  const bool same = std::ranges::equal(ksp::entries(found), ksp::entries(expected), [](auto one, auto other) {
-    return one.name == other.name && one.value == other.value;
-  });
-  const auto entries = std::ranges::distance(ksp::entries(expected));
-  if (!same || entries == 0) {
+  if (!ksp::test::agrees<Context>(library, plain, stream.data(), length) || entries == 0) {
     std::cerr << name << ": the library and the plain yardstick differ\n";
     std::exit(1);
   }
@@ -170,7 +142,7 @@ void group(const std::string& name, const Bytes& stream, Library library, Plain 
   });
   benchmark::RegisterBenchmark((name + "/plain").c_str(), [=](benchmark::State& state) {
     Context context;
-    measureParser(state, stream, plain, context);
+    measureParser(state, stream, intoNodes<nodes>(plain), context);
   });
   benchmark::RegisterBenchmark((name + "/floor").c_str(),
                                [=](benchmark::State& state) { measureFloor<nodes>(state, entries); });
@@ -180,9 +152,11 @@ void group(const std::string& name, const Bytes& stream, Library library, Plain 
 
 int main(int argc, char** argv) {
   const Bytes statistics = statisticsStream();
-  group<ksp::GenericContext, Nodes::kZeroed>("generic", statistics, KSPFTLParseBufferToCxt, plainGeneric);
-  group<ksp::LegacyContext, Nodes::kPlain>("legacy", statistics, KSPParseBufferToCxt, plainLegacy);
-  group<ksp::GenericContext, Nodes::kZeroed>("media", mediaStream(), KSPMSPParseBufferToCxt, plainMedia);
+  group<ksp::GenericContext, Nodes::kZeroed>("generic", statistics, KSPFTLParseBufferToCxt,
+                                             ksp::test::plainGeneric);
+  group<ksp::LegacyContext, Nodes::kPlain>("legacy", statistics, KSPParseBufferToCxt, ksp::test::plainLegacy);
+  group<ksp::GenericContext, Nodes::kZeroed>("media", mediaStream(), KSPMSPParseBufferToCxt,
+                                             ksp::test::plainMedia);
   constexpr ksp::Ratio kRatios[] = {
       {"generic/library", "generic/floor", "at most 1.25"},
       {"generic/plain", "generic/library", "at least 4"},

@@ -6,9 +6,9 @@
 #include <string>
 #include <vector>
 
-#include "bench/plain_report.h"
 #include "bench/ratio.h"
 #include "ksp/snapshot.h"
+#include "tests/plain_snapshot.h"
 
 namespace {
 
@@ -40,7 +40,7 @@ void render(benchmark::State& state, decltype(KSPParseSnapshotBuffer)* renderer)
 }
 
 BENCHMARK_CAPTURE(render, library, KSPParseSnapshotBuffer);
-BENCHMARK_CAPTURE(render, plain, plainReport);
+BENCHMARK_CAPTURE(render, plain, ksp::test::plainReport);
 
 }  // namespace
 

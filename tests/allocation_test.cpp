@@ -4,10 +4,10 @@
 
 #include <cstring>
 
-#include "fuzz/context_check.h"
 #include "ksp/error.h"
 #include "ksp/media_statistics.h"
 #include "ksp/statistics.h"
+#include "tests/context_check.h"
 #include "tests/streams.h"
 
 namespace {

@@ -5,8 +5,8 @@
 #include <algorithm>
 #include <array>
 
-#include "fuzz/context_check.h"
 #include "ksp/numbers.h"
+#include "tests/context_check.h"
 #include "tests/streams.h"
 
 namespace ksp::test {

@@ -1,26 +1,20 @@
-// Holds the parsers against parse_cases.txt. The process keeps its first message for good, so each parser
-// runs in a process of its own.
+// Holds the parsers against parse_cases.txt and against the plain ones.
 
 #include <gtest/gtest.h>
-#include <sys/wait.h>
-#include <unistd.h>
 
 #include <algorithm>
-#include <cstdio>
+#include <cstdlib>
 #include <fstream>
-#include <functional>
-#include <map>
+#include <random>
+#include <utility>
 
-#include "fuzz/context_check.h"
 #include "ksp/error.h"
-#include "ksp/exporter.h"
 #include "ksp/media_statistics.h"
 #include "ksp/records.hpp"
 #include "ksp/statistics.h"
-#include "platform/driver_service.h"
+#include "tests/context_check.h"
+#include "tests/plain_parsers.h"
 #include "tests/streams.h"
-
-const char PropertyMatchKey[] = "of this test";
 
 namespace {
 bool storeHasMemory = true;
@@ -34,24 +28,11 @@ extern "C" void* __wrap_calloc(size_t count, size_t size) {
 namespace ksp::test {
 namespace {
 
-// Returns what `action` returns and, on a second line, the message that it leaves.
-std::string apart(const std::function<std::string()>& action) {
-  int ends[2];
-  if (pipe(ends) != 0) return "no pipe";
-  const pid_t child = fork();
-  if (child == 0) {
-    std::string text = action();
-    text.append("\n").append(GetAPIErrorMessage());
-    std::FILE* const out = fdopen(ends[1], "w");
-    _exit(std::fputs(text.c_str(), out) >= 0 && std::fclose(out) == 0 ? 0 : 1);
-  }
-  close(ends[1]);
-  std::FILE* const in = fdopen(ends[0], "r");
-  std::string text;
-  for (int c = 0; (c = std::fgetc(in)) != EOF;) text.push_back(static_cast<char>(c));
-  static_cast<void>(std::fclose(in));
-  int status = 0;
-  return waitpid(child, &status, 0) == child && status == 0 ? text : "the child failed";
+// Returns the message that was left, and empties the store for the next case.
+std::string takeMessage() {
+  std::string message = GetAPIErrorMessage();
+  std::free(std::exchange(GlobalAPIErrorMessage, nullptr));
+  return message;
 }
 
 template <class Owner, class Parse>
@@ -92,8 +73,8 @@ TEST(Parse, Cases) {
   const auto check = [&] {
     if (parser.empty()) return;
     SCOPED_TRACE(what + ", " + parser);
-    const std::string found = apart([&] { return run(parser, kind, stream); });
-    EXPECT_EQ(found, expected + '\n' + message);
+    EXPECT_EQ(run(parser, kind, stream), expected);
+    EXPECT_EQ(takeMessage(), message);
     parser.clear();
     ++checked;
   };
@@ -127,91 +108,99 @@ TEST(Parse, NullStreams) {
   const auto emptyFor = [](auto parse, auto context) { return parse(context.get(), nullptr, 16); };
   EXPECT_EQ(emptyFor(KSPFTLParseBufferToCxt, GenericContext()), 0U);
   EXPECT_EQ(emptyFor(KSPParseBufferToCxt, LegacyContext()), 0);
-  EXPECT_EQ(apart([&] { return std::to_string(emptyFor(KSPMSPParseBufferToCxt, GenericContext())); }),
-            "0\nKSPMSPParseBufferToCxt: Passed in invalid buffer or empty buffer");
+  EXPECT_EQ(takeMessage(), "NA");
+  EXPECT_EQ(emptyFor(KSPMSPParseBufferToCxt, GenericContext()), 0U);
+  EXPECT_EQ(takeMessage(), "KSPMSPParseBufferToCxt: Passed in invalid buffer or empty buffer");
 }
 
-TEST(Statistics, SummaryCopiesItsStatistics) {
-  const auto valueOf = [](uint64_t key) { return key << 32 | (key + 1); };
-  std::ostringstream stream;
-  for (const uint64_t key :
-       {4U, 7U, 12U, 13U, 17U, 18U, 19U, 20U, 28U, 45U, 48U, 49U, 50U, 51U, 52U, 53U, 56U}) {
-    stream << key << ":1 " << key << ':' << valueOf(key) << ",2 ";
-  }
-  LegacyContext c;
-  ASSERT_EQ(Stream::statistics(stream.str() + "265:1..6 265:9,8").into(KSPParseBufferToCxt, c.get()), 1);
-  const std::vector<uint64_t> low = {c->exportVersion, c->numVirtualBlocks, c->blocksPerVirtualBlock,
-                                     c->pagesPerVirtualBlock, c->bytesPerPage};
-  EXPECT_EQ(low, (std::vector<uint64_t>{54, 53, 52, 51, 50}));
-  const std::vector<uint64_t> whole = {c->hostReads,      c->hostWrites,    c->numFreeVirtualBlocks,
-                                       c->wearLevMoves,   c->nandReads,     c->nandWrites,
-                                       c->bandErases,     c->IND_pool_free, c->IND_pool_count,
-                                       c->utilFormatTime, c->numSleepOps,   c->maxHighEnduranceBlockErases};
-  std::vector<uint64_t> expected;
-  for (const uint64_t key : {7U, 4U, 48U, 17U, 19U, 18U, 20U, 12U, 13U, 56U, 28U, 45U}) {
-    expected.push_back(valueOf(key));
-  }
-  EXPECT_EQ(whole, expected);
-  EXPECT_EQ(std::vector<uint64_t>(c->readCountHisto, c->readCountHisto + 5),
-            (std::vector<uint64_t>{9, 8, 3, 4, 5}));
-  EXPECT_EQ(c->reserved0 + c->reserved1[0] + c->reserved1[1] + c->reserved1[2] + c->reserved2, 0U);
-
-  c.get()->parseMarker = 0;
-  EXPECT_EQ(Stream::statistics("1*1..7").into(KSPParseBufferToCxt, c.get()), 0);
-  EXPECT_EQ(c->exportVersion, 54U) << "a stream without a word changes only the marker";
-  EXPECT_EQ(c->parseMarker, UINT32_MAX);
-  EXPECT_EQ(Stream::statistics("53:7 1#1").into(KSPParseBufferToCxt, c.get()), 0);
-  EXPECT_EQ(c->exportVersion, 0U) << "a bad header takes back the version alone";
-  EXPECT_EQ(c->hostWrites, valueOf(4));
+template <class Owner, class Parse, class Plain>
+void expectAgreement(const Stream& stream, Parse parse, Plain plain) {
+  const auto compare = [=](void*, const unsigned char* bytes, uint32_t length) {
+    return agrees<Owner>(parse, plain, bytes, length);
+  };
+  EXPECT_TRUE(stream.into(compare, static_cast<void*>(nullptr)));
 }
 
-TEST(KeyTables, AreCompleteAndFindTheirRows) {
-  std::map<unsigned, unsigned> keysOfCount;
-  for (const KeyEntry& key : kStatsKeys) ++keysOfCount[key.count];
-  const std::map<unsigned, unsigned> expected = {
-      {1, 535}, {2, 15}, {3, 3},  {4, 12}, {5, 12}, {6, 3},  {8, 12}, {9, 2},   {10, 23}, {11, 2}, {12, 2},
-      {16, 9},  {20, 1}, {22, 3}, {30, 1}, {32, 9}, {45, 1}, {64, 2}, {100, 2}, {160, 1}, {256, 1}};
-  EXPECT_EQ(keysOfCount, expected);
-  unsigned statistics = 0, media = 0, singles = 0;
-  for (uint32_t key = 0; key <= UINT16_MAX; ++key) {
-    if (const KeyEntry* const row = findStatsKey(key)) statistics += row->key == key;
-    const MSPKeyEntry* const row = LookupMSPKey(static_cast<uint16_t>(key));
-    if (row == nullptr) continue;
-    media += row->key == key && row->width == (key < 12288 ? 4 : 8);
-    singles += row->count == 1;
+// Streams of every key, then of keys, counts and ends as they fall.
+TEST(Parse, AgreesWithThePlainParsers) {
+  const auto check = [](const std::string& text) {
+    SCOPED_TRACE(text);
+    const Stream statistics = Stream::statistics(text);
+    expectAgreement<GenericContext>(statistics, KSPFTLParseBufferToCxt, plainGeneric);
+    expectAgreement<GenericContext>(statistics, KSPFTLParseStatKeyBufferToCxt, plainStatKey);
+    expectAgreement<LegacyContext>(statistics, KSPParseBufferToCxt, plainLegacy);
+    expectAgreement<GenericContext>(Stream::media(text), KSPMSPParseBufferToCxt, plainMedia);
+  };
+  std::mt19937 random(1);  // NOLINT(cert-msc32-c,cert-msc51-cpp): the same streams in each run
+  const auto record = [&](uint64_t key, uint64_t count) {
+    const uint64_t first = random() * (uint64_t{random()} + 1) / 2;
+    std::string text = std::to_string(key);
+    text += count == 0 ? ":" : ":" + std::to_string(first) + ".." + std::to_string(first + count - 1);
+    return text + " ";
+  };
+  std::string statistics, media;
+  for (const auto& row : kStatsKeys) statistics += record(row.key, row.count);
+  for (const auto& row : mspKeyTable) media += record(row.key, row.count);
+  check(statistics);
+  check(media);
+  for (int round = 0; round < 3000; ++round) {
+    std::string text;
+    for (auto left = random() % 6; left > 0; --left) {
+      const auto& statistic = kStatsKeys[random() % std::size(kStatsKeys)];
+      const auto& medium = mspKeyTable[random() % std::size(mspKeyTable)];
+      const uint64_t keys[] = {statistic.key, medium.key, statistic.key + 65536U,    random() % 900,
+                               random(),      0x1FFFF,    0x30000000 + random() % 2, 0xFFFF,
+                               0x2FFE,        0x2FFF};
+      const uint64_t counts[] = {statistic.count, medium.count, random() % 12, 1};
+      text += record(keys[random() % std::size(keys)], counts[random() % std::size(counts)]);
+      if (random() % 9 == 0) text += std::to_string(keys[0]) + "#" + std::to_string(random() % 9) + " ";
+      if (random() % 9 == 0) text += "1*1.." + std::to_string(random() % 9 + 1) + " ";
+    }
+    check(text);
   }
-  EXPECT_EQ(statistics, 651U);
-  EXPECT_EQ(media, 234U);
-  EXPECT_EQ(singles, 152U);
-  EXPECT_TRUE(findStatsKey(826) && !findStatsKey(827) && !findStatsKey(0x10001) && !findStatsKey(~0U));
 }
 
-TEST(ParserSlots, LeadToTheParsersThatAControllerNeeds) {
-  for (int row = 0; row < 3; ++row) {
-    const ExporterEntry& entry = nand_exporters_tunnel[row];
-    EXPECT_TRUE(entry.parseBuffer == KSPParseBufferToCxt && entry.releaseContext == KSPReleaseContext &&
-                entry.parseFtlBuffer == KSPFTLParseBufferToCxt &&
-                entry.parseStatKeyBuffer == KSPFTLParseStatKeyBufferToCxt &&
-                entry.releaseGenericContext == ReleaseGenericParserCxt);
-    EXPECT_EQ(entry.parseMspBuffer != nullptr, row == 0);
-    EXPECT_EQ(entry.getMspStatsSelector != nullptr, row == 0);
+TEST(Statistics, OnlyBadHeadersTakeBackTheVersion) {
+  LegacyContext context;
+  const auto versionAfter = [&](const std::string& text) {
+    Stream::statistics(text).into(KSPParseBufferToCxt, context.get());
+    return context->exportVersion;
+  };
+  EXPECT_EQ(versionAfter("53:7 4:2"), 7U);
+  EXPECT_EQ(versionAfter("4:3"), 7U);
+  EXPECT_EQ(versionAfter("1*1..7"), 7U) << "no word";
+  EXPECT_EQ(versionAfter("53:8 1#1"), 0U);
+  EXPECT_EQ(context->hostWrites, 3U);
+}
+
+uint64_t fnv1a(const std::string& text) {
+  uint64_t sum = 0xCBF29CE484222325;
+  for (const char each : text) sum = (sum ^ static_cast<unsigned char>(each)) * 0x100000001B3;
+  return sum;
+}
+
+TEST(KeyTables, HoldEveryKeyNameAndCount) {
+  std::string statistics, media;
+  for (const auto& row : kStatsKeys) {
+    statistics += std::to_string(row.key) + " " + row.name.data() + " " + std::to_string(row.count) + "\n";
   }
-  const ExporterEntry& last = nand_exporters_tunnel[3];
-  EXPECT_TRUE(!last.parseBuffer && !last.releaseContext && !last.parseMspBuffer && !last.parseFtlBuffer &&
-              !last.parseStatKeyBuffer && !last.releaseGenericContext);
+  for (const auto& row : mspKeyTable) {
+    media += std::to_string(row.key) + " " + row.name.data() + " " + std::to_string(row.count) + " " +
+             std::to_string(row.width) + "\n";
+  }
+  EXPECT_EQ(fnv1a(statistics), 0x7AF83B696C8ECAAEU);
+  EXPECT_EQ(fnv1a(media), 0xFE552B23E0AF8FBFU);
 }
 
 TEST(Message, TheFirstOneStays) {
-  EXPECT_EQ(apart([] {
-              storeHasMemory = false;
-              SetAPIErrorMessage("lost");
-              std::string before = GetAPIErrorMessage();
-              storeHasMemory = true;
-              SetAPIErrorMessage("%s", std::string(2000, 'x').c_str());
-              SetAPIErrorMessage("second");
-              return before;
-            }),
-            "NA\n" + std::string(1023, 'x'));
+  takeMessage();
+  storeHasMemory = false;
+  SetAPIErrorMessage("lost");
+  EXPECT_STREQ(GetAPIErrorMessage(), "NA");
+  storeHasMemory = true;
+  SetAPIErrorMessage("%s", std::string(2000, 'x').c_str());
+  SetAPIErrorMessage("second");
+  EXPECT_EQ(takeMessage(), std::string(1023, 'x'));
 }
 
 }  // namespace

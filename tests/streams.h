@@ -61,13 +61,6 @@ class Stream {
   std::vector<unsigned char> bytes_ = std::vector<unsigned char>(1);
 };
 
-inline GenericParserContext& listsOf(GenericParserContext& context) {
-  return context;
-}
-inline GenericParserContext& listsOf(KSPParseContext& context) {
-  return context.entries;
-}
-
 /// The entries of a context as "name=value name=value".
 template <class Context>
 std::string textOf(const Context& context) {

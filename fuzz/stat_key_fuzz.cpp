@@ -1,6 +1,0 @@
-#include "fuzz/context_check.h"
-#include "ksp/statistics.h"
-
-extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
-  return ksp::checkCounting(KSPFTLParseStatKeyBufferToCxt, data, size);
-}
