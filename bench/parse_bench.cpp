@@ -1,5 +1,6 @@
 // The parsers beside two yardsticks: the plain parsers with printf formatting, and the floor, which only
-// allocates, links and frees the nodes that the parser would have filled.
+// allocates, links and frees the nodes that the parser would have filled. And what a client pays that only
+// looks, through a context and through the records themselves.
 
 #include <algorithm>
 #include <cstdint>
@@ -148,6 +149,57 @@ void group(const std::string& name, const Bytes& stream, Library library, Plain 
                                [=](benchmark::State& state) { measureFloor<nodes>(state, entries); });
 }
 
+/// What a client has seen that looked at every name and every value.
+struct Seen {
+  uint64_t entries = 0;
+  uint64_t letters = 0;
+  uint64_t values = 0;
+
+  bool operator==(const Seen&) const = default;
+};
+
+/// Looks at every entry of a context that is filled and released for it.
+Seen throughContext(const Bytes& stream) {
+  ksp::GenericContext context;
+  KSPFTLParseBufferToCxt(context.get(), stream.data(), static_cast<uint32_t>(stream.size()));
+  Seen seen;
+  for (const auto [name, value] : ksp::entries(context)) {
+    ++seen.entries;
+    // The index behind an array's name is the context's alone.
+    seen.letters += static_cast<unsigned char>(name[0]);
+    seen.values += value;
+  }
+  return seen;
+}
+
+Seen throughRecords(const Bytes& stream) {
+  Seen seen;
+  ksp::StatisticsRecords records(stream.data(), stream.size());
+  for (const ksp::Record& record : records) {
+    const ksp::RecordName name = record.name();
+    for (const uint64_t value : record.elements) {
+      ++seen.entries;
+      seen.letters += static_cast<unsigned char>(name.view()[0]);
+      seen.values += value;
+    }
+  }
+  return seen;
+}
+
+/// Registers look/context and look/records.
+void lookGroup(const Bytes& stream) {
+  if (throughContext(stream) != throughRecords(stream) || throughRecords(stream).entries == 0) {
+    std::cerr << "look: the context and the records differ\n";
+    std::exit(1);
+  }
+  benchmark::RegisterBenchmark("look/context", [=](benchmark::State& state) {
+    for (auto _ : state) benchmark::DoNotOptimize(throughContext(stream));
+  });
+  benchmark::RegisterBenchmark("look/records", [=](benchmark::State& state) {
+    for (auto _ : state) benchmark::DoNotOptimize(throughRecords(stream));
+  });
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
@@ -157,6 +209,7 @@ int main(int argc, char** argv) {
   group<ksp::LegacyContext, Nodes::kPlain>("legacy", statistics, KSPParseBufferToCxt, ksp::test::plainLegacy);
   group<ksp::GenericContext, Nodes::kZeroed>("media", mediaStream(), KSPMSPParseBufferToCxt,
                                              ksp::test::plainMedia);
+  lookGroup(statistics);
   constexpr ksp::Ratio kRatios[] = {
       {"generic/library", "generic/floor", "at most 1.25"},
       {"generic/plain", "generic/library", "at least 4"},
@@ -164,6 +217,7 @@ int main(int argc, char** argv) {
       {"legacy/plain", "legacy/library", "at least 4"},
       {"media/library", "media/floor", "at most 1.25"},
       {"media/plain", "media/library", "at least 4"},
+      {"look/context", "look/records", "at least 8"},
   };
   return ksp::runWithRatios(argc, argv, kRatios);
 }

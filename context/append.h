@@ -29,9 +29,11 @@ bool appendEntry(GenericParserContext* context, uint64_t value, const Pieces&...
 /// Appends an entry for each element: under the bare name when there is one, else with its index behind it.
 ///
 /// Returns true when every element was appended, so also when there is none. An element for which there is no
-/// memory is left out; elements too wide or too many are refused as a whole.
+/// memory is left out; elements too wide or too many are refused as a whole. Inlined, as most callers know
+/// the elements' width.
 template <class... Pieces>
-bool appendElements(GenericParserContext* context, Elements elements, const Pieces&... pieces) {
+[[gnu::always_inline]] inline bool appendElements(GenericParserContext* context, Elements elements,
+                                                  const Pieces&... pieces) {
   if (elements.width() == 0 || elements.empty()) return true;
   if (elements.width() > kMaxElementWidth || elements.size() > kMaxElements || context == nullptr)
     return false;

@@ -1,6 +1,7 @@
 #include <cstdint>
 
 #include "context/append.h"
+#include "ksp/detail/key_name.hpp"
 #include "ksp/error.h"
 #include "ksp/records.hpp"
 #include "ksp/statistics.h"
@@ -9,10 +10,16 @@ namespace ksp {
 namespace {
 
 /// Appends the values of a record, those of an array with an underscore and their index behind its name.
-bool append(GenericParserContext* context, const Record& record) {
-  const RecordName name = record.name();
-  if (record.isArray) return appendElements(context, record.elements, name.text(), '_');
-  return appendEntry(context, record.elements[0], name.text());
+[[gnu::always_inline]] inline bool append(GenericParserContext* context, const Record& record,
+                                          const KeyName& name) {
+  if (record.isArray) return appendElements(context, record.elements, name, '_');
+  return appendEntry(context, record.elements[0], name);
+}
+
+[[gnu::always_inline]] inline bool append(GenericParserContext* context, const Record& record) {
+  // Most are listed: no name is made for these.
+  return record.isListed() ? append(context, record, record.row->name)
+                           : append(context, record, record.name().text());
 }
 
 /// Reports that a record could not be appended. Both parsers report under this name.
