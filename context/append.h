@@ -26,17 +26,25 @@ bool appendEntry(GenericParserContext* context, uint64_t value, const Pieces&...
   return appended;
 }
 
+/// Whether there is no element to append, which every context takes.
+inline bool isNothing(const Elements& elements) {
+  return elements.width() == 0 || elements.empty();
+}
+
+/// Whether a context takes these elements; too wide or too many are refused as a whole.
+inline bool takes(const GenericParserContext* context, const Elements& elements) {
+  return context != nullptr && elements.width() <= kMaxElementWidth && elements.size() <= kMaxElements;
+}
+
 /// Appends an entry for each element: under the bare name when there is one, else with its index behind it.
 ///
 /// Returns true when every element was appended, so also when there is none. An element for which there is no
-/// memory is left out; elements too wide or too many are refused as a whole. Inlined, as most callers know
-/// the elements' width.
+/// memory is left out. Inlined, as most callers know the elements' width.
 template <class... Pieces>
 [[gnu::always_inline]] inline bool appendElements(GenericParserContext* context, Elements elements,
                                                   const Pieces&... pieces) {
-  if (elements.width() == 0 || elements.empty()) return true;
-  if (elements.width() > kMaxElementWidth || elements.size() > kMaxElements || context == nullptr)
-    return false;
+  if (isNothing(elements)) return true;
+  if (!takes(context, elements)) return false;
   if (elements.size() == 1) return appendEntry(context, elements[0], pieces...);
   bool all = true;
   ListEnds ends(*context);

@@ -53,12 +53,15 @@ void freeNodes(NameValueNode* node) {
 
 int AddSingleValueToGenericContext(GenericParserContext* context, const char* prefix, const char* name,
                                    uint64_t value) {
+  if (context == nullptr) return 0;
   return ksp::appendEntry(context, value, view(prefix), view(name)) ? 1 : 0;
 }
 
 int AddMultipleFieldsToGenericContext(GenericParserContext* context, const char* name, const void* source,
                                       uint32_t width, uint32_t count) {
   const ksp::Elements elements(static_cast<const unsigned char*>(source), width, count);
+  if (ksp::isNothing(elements)) return 1;
+  if (!ksp::takes(context, elements)) return 0;
   return ksp::appendElements(context, elements, view(name)) ? 1 : 0;
 }
 

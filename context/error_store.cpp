@@ -16,7 +16,6 @@ void SetAPIErrorMessage(const char* format, ...) {
   if (message == nullptr) return;
   va_list arguments;
   va_start(arguments, format);
-  // NOLINTNEXTLINE(clang-analyzer-valist.Uninitialized): va_start is two lines above
   static_cast<void>(std::vsnprintf(message, kMessageSize, format, arguments));
   va_end(arguments);
   GlobalAPIErrorMessage = message;

@@ -2,10 +2,16 @@
 
 #include <unistd.h>
 
+#include <cstddef>
+#include <cstdint>
 #include <cstdio>
 
 #include "controller/lookup.h"
 #include "platform/driver_service.h"
+
+// Clients of other languages read it by offset.
+static_assert(offsetof(KSPConnection, service) == 0 && offsetof(KSPConnection, connection) == 4 &&
+              offsetof(KSPConnection, exporter) == 8 && sizeof(KSPConnection) == 8 + sizeof(void*));
 
 namespace {
 

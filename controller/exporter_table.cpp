@@ -1,8 +1,35 @@
 #include "ksp/exporter.h"
 
+#include <cstddef>
+#include <cstdint>
+
 #include "ksp/media_statistics.h"
 #include "ksp/statistics.h"
 #include "platform/driver_service.h"
+
+// Clients of other languages read these structures by offset.
+static_assert(sizeof(SelectorPair) == 8 && offsetof(SelectorPair, word0) == 0 &&
+              offsetof(SelectorPair, word1) == 4);
+#ifdef __LP64__
+static_assert(offsetof(ExporterEntry, className) == 0 && offsetof(ExporterEntry, propertyKey) == 8 &&
+              offsetof(ExporterEntry, connection) == 16 && offsetof(ExporterEntry, service) == 20 &&
+              offsetof(ExporterEntry, extraMethod) == 24 && offsetof(ExporterEntry, tunnelMethod) == 28 &&
+              offsetof(ExporterEntry, secondaryMethod) == 32 &&
+              offsetof(ExporterEntry, getStatsSelector) == 40 &&
+              offsetof(ExporterEntry, getReadStatsSelector) == 48 &&
+              offsetof(ExporterEntry, getMspStatsSelector) == 56 &&
+              offsetof(ExporterEntry, getDefectsListSelector) == 64 &&
+              offsetof(ExporterEntry, getTelemetryListSelectors) == 72 &&
+              offsetof(ExporterEntry, getTaskSchedulerSelectors) == 80 &&
+              offsetof(ExporterEntry, getSnapshotSelectors) == 88 &&
+              offsetof(ExporterEntry, getSnapshotHeaderSelectors) == 96 &&
+              offsetof(ExporterEntry, getBandStatsSelector) == 104 &&
+              offsetof(ExporterEntry, parseBuffer) == 112 && offsetof(ExporterEntry, releaseContext) == 120 &&
+              offsetof(ExporterEntry, parseMspBuffer) == 128 &&
+              offsetof(ExporterEntry, parseFtlBuffer) == 136 &&
+              offsetof(ExporterEntry, parseStatKeyBuffer) == 144 &&
+              offsetof(ExporterEntry, releaseGenericContext) == 152 && sizeof(ExporterEntry) == 160);
+#endif
 
 // Selector numbers of the controller's commands.
 const SelectorPair statsSelector = {13, 13};

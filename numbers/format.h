@@ -15,25 +15,46 @@ namespace ksp {
 /// How a number is shown: a short text in front, then the digits, right-aligned in at least `width` columns.
 struct NumberFormat {
   static constexpr size_t kLongestPrefix = 8;
-  static constexpr size_t kWidestField = 8;
+  static constexpr unsigned kWidestField = 8;
 
   char prefix[kLongestPrefix] = {};
   uint8_t prefixLength = 0;
   uint8_t width = 0;
   char fill = ' ';
 
-  /// Takes the same notation as printf, of which it knows PREFIX%Nu and PREFIX%0Nu, N being one digit.
+  /// Takes the same notation as printf, of which it knows PREFIX%Nu and PREFIX%0Nu, N being one digit from 1
+  /// to 8. Anything else does not compile.
   template <size_t Size>
   consteval NumberFormat(const char (&notation)[Size]) {
-    const std::string_view text(notation, Size - 1);
-    const size_t percent = text.find('%');
-    std::copy_n(notation, percent, prefix);
+    if (!read({notation, Size - 1})) notationIsUnknown();
+  }
+
+  static constexpr bool isNotation(std::string_view text) { return NumberFormat().read(text); }
+
+ private:
+  constexpr NumberFormat() = default;
+  // Not constant, so that a constant expression cannot get here.
+  static void notationIsUnknown();
+
+  constexpr bool read(std::string_view text) {
+    const size_t percent = std::min(text.find('%'), text.size());
+    if (percent > kLongestPrefix) return false;
+    std::copy_n(text.begin(), percent, prefix);
     prefixLength = static_cast<uint8_t>(percent);
-    if (text[percent + 1] == '0') fill = '0';
-    width = static_cast<uint8_t>(text[Size - 3] - '0');
-    if (width > kWidestField) (void)text.at(Size);  // no constant, so it does not compile
+    text.remove_prefix(percent);
+    const bool isPadded = text.starts_with("%0");
+    if (isPadded) fill = '0';
+    text.remove_prefix(std::min<size_t>(isPadded ? 2 : 1, text.size()));
+    if (text.size() != 2 || text[0] < '1' || text[1] != 'u') return false;
+    width = static_cast<uint8_t>(text[0] - '0');
+    return width <= kWidestField;
   }
 };
+static_assert(NumberFormat::isNotation("%8u") && NumberFormat::isNotation(" R=%04u"));
+static_assert(!NumberFormat::isNotation("%12u") && !NumberFormat::isNotation("%9u") &&
+              !NumberFormat::isNotation("%0u") && !NumberFormat::isNotation("%u") &&
+              !NumberFormat::isNotation("%4d") && !NumberFormat::isNotation("%4u ") &&
+              !NumberFormat::isNotation("no number") && !NumberFormat::isNotation("too long %4u"));
 
 constexpr size_t kMostDigits = 10;
 

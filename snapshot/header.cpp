@@ -30,10 +30,11 @@ bool SnapshotHeader::holds(const FieldDescriptor& field) const {
   return uint64_t{field.offset} + size <= recordSize();
 }
 
-bool SnapshotHeader::hasKey() const {
-  if (descriptorCount() == 0) return false;
+std::optional<uint32_t> SnapshotHeader::keyOffset() const {
+  if (descriptorCount() == 0) return std::nullopt;
   const FieldDescriptor first = descriptor(0);
-  return holds(first) && uint64_t{first.offset} + kWordBytes <= recordSize();
+  if (!holds(first) || uint64_t{first.offset} + kWordBytes > recordSize()) return std::nullopt;
+  return first.offset;
 }
 
 const char* snapshotHeaderFault(const void* header, uint64_t size) {

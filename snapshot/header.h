@@ -1,6 +1,7 @@
 #pragma once
 
 #include <cstdint>
+#include <optional>
 
 #include "snapshot/word.h"
 
@@ -59,9 +60,10 @@ class SnapshotHeader {
   /// Whether a field lies within a record.
   bool holds(const FieldDescriptor& field) const;
 
-  /// Whether a record's key, the first word of the first descriptor's field, can be read; without one no slot
-  /// is in use.
-  bool hasKey() const;
+  /// Where a record's key lies in it: the first word of the first descriptor's field. Without one that can be
+  /// read no slot is in use.
+  std::optional<uint32_t> keyOffset() const;
+  bool hasKey() const { return keyOffset().has_value(); }
 
  private:
   const uint8_t* bytes_;

@@ -2,6 +2,7 @@
 
 #include <cstdint>
 #include <ctime>
+#include <optional>
 
 #include "ksp/snapshot.h"
 #include "numbers/format.h"
@@ -80,11 +81,12 @@ bool writePage(PieceWriter& page, const void* records, uint64_t length, const Sn
   if (!page.fits()) return false;
 
   const uint32_t end = header.endOfRecords(length);
-  if (cursor < end && !header.hasKey()) cursor = end;
+  const std::optional<uint32_t> key = header.keyOffset();
+  if (!key && cursor < end) cursor = end;
   while (cursor < end) {
     const uint32_t offset = header.recordOffset(cursor++);
     const uint8_t* record = static_cast<const uint8_t*>(records) + offset;
-    if (loadWord(record + header.descriptor(0).offset) == 0) continue;
+    if (loadWord(record + *key) == 0) continue;
     writeLine(page, header, record);
     if (!page.fits()) return false;
     kept = page.length();

@@ -13,22 +13,30 @@
 
 namespace {
 
-using namespace ksp;
+using ksp::kRecordBytes;
+using ksp::kWordBytes;
+using ksp::loadWord;
+using ksp::NumberFormat;
 
-constexpr size_t kNumbers = std::size(kBeforeHysteresis) + 2 + std::size(kAfterHysteresis) +
-                            2 * std::size(ksp::kTripleColumns) * kPriorities;
+// What a line is made of, besides its newline: numbers, and a label in front of each column of triples, of
+// which there are two arrays.
+constexpr size_t kColumns = 2 * std::size(ksp::kTripleColumns);
+constexpr size_t kNumbers =
+    std::size(ksp::kBeforeHysteresis) + 2 + std::size(ksp::kAfterHysteresis) + kColumns * ksp::kPriorities;
+constexpr size_t kLabelLength = 4;
+constexpr size_t kLongestLine = kNumbers * ksp::kLongestNumber + kColumns * kLabelLength + 1;
 
 /// The line of one record, made where the longest one has room, so that no number needs a check of its own.
 class Line {
  public:
   explicit Line(const uint8_t* record) {
-    write(record, kBeforeHysteresis);
-    const ksp::Thousandths hysteresis(loadWord(record + kWordBytes * kHysteresis));
+    write(record, ksp::kBeforeHysteresis);
+    const ksp::Thousandths hysteresis(loadWord(record + kWordBytes * ksp::kHysteresis));
     number(" TH=%8u", hysteresis.whole);
     number(".%02u", hysteresis.hundredths);
-    write(record, kAfterHysteresis);
-    write(record, " R", kReadTriples);
-    write(record, " W", kWriteTriples);
+    write(record, ksp::kAfterHysteresis);
+    write(record, " R", ksp::kReadTriples);
+    write(record, " W", ksp::kWriteTriples);
     *end_++ = '\n';
   }
 
@@ -39,19 +47,21 @@ class Line {
 
  private:
   template <size_t Count>
-  void write(const uint8_t* record, const RecordField (&fields)[Count]) {
-    for (const RecordField& field : fields) number(field.format, loadWord(record + kWordBytes * field.word));
+  void write(const uint8_t* record, const ksp::RecordField (&fields)[Count]) {
+    for (const ksp::RecordField& field : fields)
+      number(field.format, loadWord(record + kWordBytes * field.word));
   }
 
   void write(const uint8_t* record, const char (&direction)[3], size_t firstWord) {
-    ksp::writeTriples(*this, record + kWordBytes * firstWord, kPriorities, [&](const char* letter) {
-      const char label[] = {direction[0], direction[1], *letter, '='};
+    ksp::writeTriples(*this, record + kWordBytes * firstWord, ksp::kPriorities, [&](const char* letter) {
+      const char label[kLabelLength] = {direction[0], direction[1], *letter, '='};
       std::memcpy(end_, label, sizeof label);
       end_ += sizeof label;
     });
   }
 
-  char text_[kNumbers * ksp::kLongestNumber + ksp::kNumberRoom];
+  // The last number may be stored with room behind it.
+  char text_[kLongestLine + ksp::kNumberRoom - ksp::kLongestNumber];
   char* end_ = text_;
 };
 

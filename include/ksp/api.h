@@ -5,7 +5,7 @@
 
 #include <stdint.h>
 
-#define KSP_API __attribute__((visibility("default")))
+#define KSP_API __attribute__((__visibility__("default")))
 
 #ifdef __cplusplus
 #define KSP_BEGIN_DECLARATIONS extern "C" {

@@ -74,8 +74,8 @@ typedef struct KSPParseContext {
  * Appends one entry, named `prefix` directly followed by `name` and cut to 98 characters.
  *
  * Every byte of its nodes that holds nothing is 0.
- * `context` may be null; `prefix` and `name` are NUL-terminated. Costs two allocations and constant time.
- * Returns 1; or 0 when `context` is null or memory ran out, with the context as it was.
+ * `context` may be null, and `prefix` and `name`, NUL-terminated, are not read then. Costs two allocations
+ * and constant time. Returns 1; or 0 when `context` is null or memory ran out, with the context as it was.
  */
 KSP_API int AddSingleValueToGenericContext(GenericParserContext* context, const char* prefix,
                                            const char* name, uint64_t value);
@@ -85,9 +85,9 @@ KSP_API int AddSingleValueToGenericContext(GenericParserContext* context, const 
  *
  * `source` holds `width` * `count` bytes of any alignment, `width` is 1 to 8 and `count` at most 65535. One
  * entry bears the bare `name`; several bear `name` directly followed by their decimal index from 0.
- * Returns 1 when every element was appended, and also when `width` or `count` is 0 (nothing is read or
- * appended then). Returns 0 when `width` or `count` is above its limit or `context` is null, with nothing
- * appended; or when memory ran out, with every element appended for which there was memory.
+ * Returns 1 when every element was appended, and also when `width` or `count` is 0 (nothing is read, not even
+ * `name`, or appended then). Returns 0 when `width` or `count` is above its limit or `context` is null, with
+ * nothing read or appended; or when memory ran out, with every element appended for which there was memory.
  */
 KSP_API int AddMultipleFieldsToGenericContext(GenericParserContext* context, const char* name,
                                               const void* source, uint32_t width, uint32_t count);

@@ -21,7 +21,7 @@ KSP_API extern char* GlobalAPIErrorMessage;
  * `format` is a printf format of the caller's own, never text from outside. When memory runs out nothing is
  * stored and a later call tries again.
  */
-KSP_API void SetAPIErrorMessage(const char* format, ...) __attribute__((format(printf, 1, 2)));
+KSP_API void SetAPIErrorMessage(const char* format, ...) __attribute__((__format__(__printf__, 1, 2)));
 
 /** Returns the stored message, or "NA" when there is none. The text is the library's, for good. */
 KSP_API const char* GetAPIErrorMessage(void);

@@ -1,6 +1,9 @@
 /* Decodes a statistics capture and looks the controller up, as a client in C. */
 
+/* As libraries for translated texts do. */
+#define printf client_printf
 #include <ksp/ksp.h>
+#undef printf
 #include <ksp/platform/driver_service.h>
 #include <stdio.h>
 
