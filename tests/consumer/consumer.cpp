@@ -6,6 +6,7 @@
 #include <iostream>
 #include <iterator>
 #include <ksp/entries.hpp>
+#include <ksp/records.hpp>
 #include <vector>
 
 int main(int argc, char** argv) {
@@ -21,5 +22,14 @@ int main(int argc, char** argv) {
   const uint32_t total =
       KSPFTLParseBufferToCxt(context.get(), stream.data(), static_cast<uint32_t>(stream.size()));
   const auto [name, value] = *ksp::entries(context).begin();
+
+  // The same without a context.
+  ksp::StatisticsRecords records(stream.data(), stream.size());
+  const ksp::RecordName first = records.begin()->name();
+  if (first.view() != name) return 3;
+  uint64_t values = 0;
+  for (const ksp::Record& record : records) values += record.elements.size();
+  if (values != total || records.ending().reason != ksp::EndReason::kComplete) return 4;
+
   std::cout << total << " values, first " << name << " = " << value << ", " << GetAPIErrorMessage() << '\n';
 }
