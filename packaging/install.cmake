@@ -47,6 +47,6 @@ install(DIRECTORY examples/hosts DESTINATION ${documents}/brellium/examples)
 install(FILES docs/formats.md docs/fleet.md DESTINATION ${documents}/kspdump)
 install(DIRECTORY examples/captures DESTINATION ${documents}/kspdump/examples
         PATTERN generate.cpp EXCLUDE)
-install(DIRECTORY examples/cluster DESTINATION ${documents}/kspdump/examples
+install(DIRECTORY examples/cluster examples/monitoring DESTINATION ${documents}/kspdump/examples
         USE_SOURCE_PERMISSIONS PATTERN __pycache__ EXCLUDE)
 install(FILES platform/README.md DESTINATION ${documents}/libksp-dev RENAME porting.md)

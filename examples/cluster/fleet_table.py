@@ -8,6 +8,7 @@ import json
 import pathlib
 import re
 import sys
+import zlib
 
 import cloudpickle
 import dask
@@ -40,19 +41,22 @@ def records(document, name):
 def rows(part, name, pattern):
     """The values of a name in one file of the table."""
     found = []
-    with gzip.open(part) as documents:
-        for document in documents:
-            for record in records(document, name):
-                source = json.loads(re.match(rb'\{"source":("(?:[^"\\]|\\.)*")', document)[1])
-                found += [(source, *unit_and_day(source, pattern), record["key"], element, value)
-                          for element, value in enumerate(record["values"])]
+    try:
+        with gzip.open(part) as documents:
+            for document in documents:
+                for record in records(document, name):
+                    source = json.loads(re.match(rb'\{"source":("(?:[^"\\]|\\.)*")', document)[1])
+                    found += [(source, *unit_and_day(source, pattern), record["key"], element, value)
+                              for element, value in enumerate(record["values"])]
+    except (EOFError, OSError, zlib.error) as error:
+        raise OSError(f"{part}: {error}") from error
     return found
 
 
 def statistic(folder, name, pattern=USUAL_PATTERN):
     """A row for each value of a name, in the order of sources. Runs on the Dask client that is active, else on
     this machine's cores. Values are exact 64-bit numbers."""
-    parts = sorted(pathlib.Path(folder).glob("*.jsonl.gz"))
+    parts = sorted(pathlib.Path(folder).rglob("*.jsonl.gz"))
     found = dask.compute([dask.delayed(rows)(str(part), name, pattern) for part in parts])[0]
     frame = pandas.DataFrame([row for part in found for row in part], columns=COLUMNS)
     return frame.astype({"value": numpy.uint64}).sort_values(["source", "key", "element"], ignore_index=True)

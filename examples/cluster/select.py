@@ -11,13 +11,11 @@ import sys
 sys.path.append(sys.path.pop(0))
 
 import argparse
-import contextlib
 import pathlib
 import re
 import signal
 
 import dask
-import distributed
 
 import fleet_table
 
@@ -37,6 +35,14 @@ def pattern(text):
     return text
 
 
+def cluster(scheduler):
+    if scheduler is None:
+        return dask.config.set(scheduler="processes")
+    import distributed  # takes long to load
+
+    return distributed.Client(scheduler, timeout=10)
+
+
 def main():
     parser = argparse.ArgumentParser(description=__doc__, formatter_class=argparse.RawDescriptionHelpFormatter)
     parser.add_argument("folder", metavar="FOLDER", type=pathlib.Path, help="the table's folder")
@@ -52,14 +58,13 @@ def main():
     arguments = parser.parse_args()
     signal.signal(signal.SIGPIPE, signal.SIG_DFL)
     folder = arguments.folder.absolute()
-    if not any(folder.glob("*.jsonl.gz")):
+    if not any(folder.rglob("*.jsonl.gz")):
         complain(f"{folder}: no table of decode.py", 2)
-    with contextlib.ExitStack() as stack:
-        if arguments.scheduler:
-            stack.enter_context(distributed.Client(arguments.scheduler, timeout=10))
-        else:
-            stack.enter_context(dask.config.set(scheduler="processes"))
-        frame = fleet_table.statistic(folder, arguments.name, arguments.pattern)
+    try:
+        with cluster(arguments.scheduler):
+            frame = fleet_table.statistic(folder, arguments.name, arguments.pattern)
+    except (OSError, ValueError) as error:
+        complain(error, 3)
     if frame.empty:
         complain(f"{folder}: no capture has a record {arguments.name}", 1)
     if arguments.moved:
