@@ -212,14 +212,12 @@ TEST_F(Kspdump, ManyFilesComeOutInOrderWhateverTheJobs) {
     std::string bytes;
     for (int k = 0; k < (i % 7) * 400; ++k) bytes += record(4, {static_cast<uint64_t>(i)});
     write(name, bytes + record(5, {1}));
-    files += " " + name + (i == 30 ? " missing ." : "");
+    files += " " + name + (i == 30 ? " missing" : "");
   }
   const Outcome alone = run("stats --format json --jobs 1" + files);
   const Outcome together = run("stats --format json --jobs 8" + files);
   EXPECT_EQ(alone.status, 3);
-  EXPECT_EQ(alone.err,
-            "kspdump: missing: cannot be read: No such file or directory\n"
-            "kspdump: .: cannot be read: Is a directory\n");
+  EXPECT_EQ(alone.err, "kspdump: missing: cannot be read: No such file or directory\n");
   EXPECT_EQ(together.out, alone.out);
   EXPECT_EQ(together.err, alone.err);
   std::istringstream lines(alone.out);
@@ -228,6 +226,35 @@ TEST_F(Kspdump, ManyFilesComeOutInOrderWhateverTheJobs) {
     EXPECT_EQ(json::parse(line)["source"], "f" + std::to_string(next));
   }
   EXPECT_EQ(next, 60);
+
+  // Folders and archives, within each other too, are found on the way.
+  fs::create_directories(folder_ / "d/e");
+  write("d/notes", "no capture");
+  ASSERT_EQ(shell("cp f* d/e && tar czf d/a.tar.gz f? && tar cf d/e/f35.tar f1? d/a.tar.gz").status, 0);
+  const Outcome found = run("stats --format csv --jobs 1 f1 d f2 d/e/f35.tar missing d/notes");
+  EXPECT_EQ(found.status, 3);
+  EXPECT_EQ(found.err.substr(0, found.err.find('\n')),
+            "kspdump: d: passed over 1 file that is no statistics capture");
+  for (const char* jobs : {"2", "3", "16"}) {
+    const Outcome same =
+        run(std::string("stats --format csv --jobs ") + jobs + " f1 d f2 d/e/f35.tar missing d/notes");
+    EXPECT_EQ(same.out, found.out) << jobs;
+    EXPECT_EQ(same.err, found.err) << jobs;
+  }
+  std::vector<std::string> order;
+  std::istringstream rows(found.out);
+  for (std::string row; std::getline(rows, row);) {
+    if (order.empty() || order.back() != row.substr(0, row.find(',')))
+      order.push_back(row.substr(0, row.find(',')));
+  }
+  EXPECT_EQ(order.size(), 1 + 1 + 10 + 60 + 20 + 1 + 20u);
+  EXPECT_EQ(order[2], "d/a.tar.gz/f0");
+  EXPECT_EQ(order[42], "d/e/f35.tar/f10");
+  EXPECT_EQ(order[61], "d/e/f35.tar/d/a.tar.gz/f9");
+  EXPECT_EQ(order[62], "d/e/f36");
+  EXPECT_EQ(order[92], "f2");
+  fs::create_directory(folder_ / "empty");
+  EXPECT_EQ(run("stats empty").err, "kspdump: empty: holds no statistics capture\n");
 }
 
 TEST_F(Kspdump, TheFixedSnapshotIsTheLibrarysReport) {

@@ -8,9 +8,9 @@
 #include <clocale>
 #include <cstdio>
 #include <string>
-#include <thread>
 #include <vector>
 
+#include "tools/kspdump/in_order.h"
 #include "tools/kspdump/run.h"
 #include "tools/kspdump/view/text.h"
 
@@ -21,7 +21,7 @@ using namespace kspdump;
 class CommandLine {
  public:
   explicit CommandLine(Options& options) : options_(options) {
-    options_.jobs = std::max(1U, std::thread::hardware_concurrency());
+    options_.jobs = usableCores();
     app_.set_version_flag("--version", kVersion);
     app_.require_subcommand(1);
     app_.footer(

@@ -1,9 +1,11 @@
 #pragma once
 
+#include <cstdint>
 #include <string>
 #include <vector>
 
 #include "tools/kspdump/decode/decode.h"
+#include "tools/kspdump/source/source.h"
 #include "tools/kspdump/view/view.h"
 
 namespace kspdump {
@@ -18,6 +20,12 @@ struct Options {
   Decoding decoding;
   /// Files, or "-" for standard input.
   std::vector<std::string> sources;
+  /// What standard input is called in the results; empty for "-".
+  std::string label;
+  /// File of more sources, each ended by a NUL, or "-"; empty for none.
+  std::string sourcesFrom;
+  /// The greatest capture that is read, in bytes.
+  uint64_t mostBytes = Reading::kUsualGreatest;
   /// File of the snapshot's header; empty for none.
   std::string header;
   /// File to write to; empty for standard output.

@@ -1,64 +1,127 @@
-#include "tools/kspdump/source/source.h"
-
 #include <fcntl.h>
+#include <poll.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
-#include <limits>
+#include <system_error>
+
+#include "tools/kspdump/source/stream.h"
 
 namespace kspdump {
 
-namespace {
-
-/// The parsers take lengths of 32 bits.
-constexpr size_t kGreatestCapture = std::numeric_limits<uint32_t>::max();
-constexpr size_t kLeastRead = size_t{1} << 16;
-
-class Descriptor {
- public:
-  explicit Descriptor(const std::string& path)
-      : number_(path == "-" ? STDIN_FILENO : open(path.c_str(), O_RDONLY | O_CLOEXEC)) {}
-  Descriptor(const Descriptor&) = delete;
-  Descriptor& operator=(const Descriptor&) = delete;
-  ~Descriptor() {
-    if (number_ > STDIN_FILENO) close(number_);
-  }
-
-  int number() const { return number_; }
-
- private:
-  int number_;
-};
-
-}  // namespace
-
-std::string readFile(const std::string& path, std::vector<unsigned char>& bytes) {
-  bytes.clear();
-  const Descriptor file(path);
+File::File(int descriptor) : descriptor_(descriptor) {
   struct stat status = {};
-  if (file.number() < 0 || fstat(file.number(), &status) != 0) return std::strerror(errno);
-  if (S_ISREG(status.st_mode) && static_cast<uint64_t>(status.st_size) > kGreatestCapture) {
-    return "larger than 4 GiB";
-  }
-  // One byte more than the file is said to hold, so that its end is seen without growing.
-  const size_t expected = S_ISREG(status.st_mode) ? static_cast<size_t>(status.st_size) + 1 : kLeastRead;
-  size_t size = 0;
-  for (;;) {
-    if (size > kGreatestCapture) return "larger than 4 GiB";
-    if (size == bytes.size()) {
-      bytes.resize(std::min(std::max({expected, kLeastRead, size * 2}), kGreatestCapture + 1));
+  if (fstat(descriptor_, &status) != 0) return;
+  isFolder_ = S_ISDIR(status.st_mode);
+  isRegular_ = S_ISREG(status.st_mode);
+  if (isRegular_) {
+    // What others have read of standard input is gone; its offsets are not ours.
+    if (descriptor_ != STDIN_FILENO || lseek(descriptor_, 0, SEEK_CUR) == 0) {
+      size_ = static_cast<uint64_t>(status.st_size);
     }
-    const ssize_t got = read(file.number(), bytes.data() + size, bytes.size() - size);
-    if (got < 0 && errno == EINTR) continue;
-    if (got < 0) return std::strerror(errno);
-    if (got == 0) break;
-    size += static_cast<size_t>(got);
+  } else if (S_ISBLK(status.st_mode)) {
+    const off_t end = lseek(descriptor_, 0, SEEK_END);
+    if (end > 0 && lseek(descriptor_, 0, SEEK_SET) == 0) size_ = static_cast<uint64_t>(end);
   }
-  bytes.resize(size);
-  return "";
+}
+
+File::~File() {
+  if (descriptor_ != STDIN_FILENO) close(descriptor_);
+}
+
+size_t File::read(unsigned char* out, size_t size) {
+  // The end of a file that has its whole size needs no further call.
+  if (isAtEnd_) return 0;
+  for (;;) {
+    const ssize_t got = ::read(descriptor_, out, size);
+    if (got >= 0) {
+      const auto count = static_cast<size_t>(got);
+      at_ += count;
+      isAtEnd_ = isRegular_ && count < size && at_ == size_;
+      return count;
+    }
+    if (errno == EAGAIN) {
+      pollfd readable = {.fd = descriptor_, .events = POLLIN, .revents = 0};
+      poll(&readable, 1, -1);
+    } else if (errno != EINTR) {
+      throw ReadFault(std::generic_category().message(errno));
+    }
+  }
+}
+
+bool File::seek(uint64_t offset) {
+  if (size_ == 0 || lseek(descriptor_, static_cast<off_t>(offset), SEEK_SET) < 0) return false;
+  at_ = offset;
+  isAtEnd_ = false;
+  return true;
+}
+
+std::unique_ptr<File> openFile(const std::string& path, bool found) {
+  if (path == "-") return std::make_unique<File>(STDIN_FILENO);
+  // What was a file when its folder was read may be a pipe by now, or a link.
+  const int descriptor = open(path.c_str(), O_RDONLY | O_CLOEXEC | (found ? O_NOFOLLOW | O_NONBLOCK : 0));
+  if (descriptor < 0) throw ReadFault(std::generic_category().message(errno));
+  return std::make_unique<File>(descriptor);
+}
+
+Rejoined::Rejoined(Buffer head, std::unique_ptr<Stream> rest)
+    : head_(std::move(head)), rest_(std::move(rest)) {}
+
+size_t Rejoined::read(unsigned char* out, size_t size) {
+  if (at_ < head_.size()) {
+    const size_t count = std::min<size_t>(size, head_.size() - at_);
+    std::memcpy(out, head_.data() + at_, count);
+    at_ += count;
+    return count;
+  }
+  return rest_ == nullptr ? 0 : rest_->read(out, size);
+}
+
+bool Rejoined::seek(uint64_t offset) {
+  if (rest_ == nullptr) {
+    at_ = std::min<uint64_t>(offset, head_.size());
+    return true;
+  }
+  if (!rest_->seek(offset)) return false;
+  at_ = head_.size();
+  return true;
+}
+
+uint64_t Rejoined::size() const {
+  return rest_ == nullptr ? head_.size() : rest_->size();
+}
+
+void Expansion::gave(uint64_t bytes) {
+  constexpr uint64_t kUtmostRatio = 1000;
+  given_ += bytes;
+  if (given_ > greatest_ && given_ - greatest_ > kUtmostRatio * taken_) {
+    throw ReadFault("unpacks to a thousand times its size and more");
+  }
+}
+
+std::string largerThan(uint64_t greatest) {
+  constexpr const char* kUnits[] = {"bytes", "KiB", "MiB", "GiB"};
+  size_t unit = 0;
+  for (; unit + 1 < std::size(kUnits) && greatest != 0 && greatest % 1024 == 0; ++unit) greatest /= 1024;
+  return "larger than " + std::to_string(greatest) + " " + kUnits[unit] + " (--max-size)";
+}
+
+void readAll(Stream& stream, uint64_t greatest, Buffer& bytes) {
+  constexpr uint64_t kUsualRead = uint64_t{1} << 16;
+  // Of what is said to follow, and of the most, one byte more, so that their end is seen.
+  const uint64_t expected = stream.size() >= bytes.size() ? stream.size() - bytes.size() + 1 : 1;
+  uint64_t wanted = std::max(expected, kUsualRead);
+  for (;;) {
+    if (bytes.size() > greatest) throw ReadFault(largerThan(greatest));
+    const auto count = static_cast<size_t>(std::min(wanted, greatest + 1 - bytes.size()));
+    const size_t got = stream.read(bytes.room(count), count);
+    if (got == 0) return;
+    bytes.added(got);
+    wanted = wanted > got + kUsualRead ? wanted - got : kUsualRead;
+  }
 }
 
 }  // namespace kspdump
