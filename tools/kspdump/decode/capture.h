@@ -48,6 +48,11 @@ class Values {
     }
   }
 
+  /// One of the values alone.
+  [[nodiscard]] Values only(uint32_t i) const {
+    return {first_ + std::ptrdiff_t{stride_} * i, 1, width_, stride_};
+  }
+
   /// The values of the same field in a record that lies so far behind.
   [[nodiscard]] Values movedBy(std::ptrdiff_t bytes) const {
     return {first_ + bytes, count_, width_, stride_};
@@ -101,6 +106,8 @@ struct Capture {
   Kind kind = Kind::kStats;
   /// Valid while the capture is shown.
   Bytes bytes;
+  /// How many these were.
+  uint64_t size = 0;
   /// The snapshot's header; empty for the fixed layout.
   Bytes header;
   /// Records in the capture, and those of them that are selected.

@@ -39,6 +39,7 @@ void decode(const Decoding& decoding, Capture& capture, const TakeRecords& take)
   capture.clear();
   capture.kind = decoding.kind;
   capture.header = decoding.header;
+  capture.size = capture.bytes.size();
   Collector collector(capture, decoding, take);
   kDecoders[static_cast<size_t>(decoding.kind)](decoding, capture, collector);
   collector.finish();

@@ -15,6 +15,7 @@ const Form kForms[] = {
     {"table", makeTable, {kStatistics, kSnapshot, kDifference}},
     {"json", makeJson, {kStatistics, kSnapshot, kDifference}},
     {"csv", makeCsv, {kStatistics, kSnapshot, kDifference}},
+    {"html", makeHtml, {kStatistics, kSnapshot, kDifference, kTrend}},
     {"openmetrics", makeMetrics, {kStatistics, kSnapshot}},
 };
 

@@ -11,6 +11,7 @@ std::unique_ptr<View> makeTable(const ViewOptions& options, Sink& sink);
 std::unique_ptr<View> makeReport(const ViewOptions& options, Sink& sink);
 std::unique_ptr<View> makeJson(const ViewOptions& options, Sink& sink);
 std::unique_ptr<View> makeCsv(const ViewOptions& options, Sink& sink);
+std::unique_ptr<View> makeHtml(const ViewOptions& options, Sink& sink);
 std::unique_ptr<View> makeMetrics(const ViewOptions& options, Sink& sink);
 
 }  // namespace kspdump

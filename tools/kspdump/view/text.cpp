@@ -99,13 +99,24 @@ void appendCsv(std::string& out, std::string_view text) {
   out += '"';
 }
 
-std::string printable(std::string_view text) {
-  const uint32_t most = localeIsUtf8() ? 0x10FFFF : 0x7E;
+namespace {
+
+std::string legibleUpTo(uint32_t most, std::string_view text) {
   return spelledOutUnless(text, [&](uint32_t c) {
     const bool isControl = c < ' ' || (c >= 0x7F && c < 0xA0);
     const bool turnsText = (c >= 0x202A && c <= 0x202E) || (c >= 0x2066 && c <= 0x2069);
     return c <= most && !isControl && !turnsText;
   });
+}
+
+}  // namespace
+
+std::string legible(std::string_view text) {
+  return legibleUpTo(0x10FFFF, text);
+}
+
+std::string printable(std::string_view text) {
+  return legibleUpTo(localeIsUtf8() ? 0x10FFFF : 0x7E, text);
 }
 
 bool localeIsUtf8() {

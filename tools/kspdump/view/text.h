@@ -68,7 +68,10 @@ void appendJson(std::string& out, std::string_view text);
 /// Appends a text as a CSV field, and as UTF-8.
 void appendCsv(std::string& out, std::string_view text);
 
-/// A text without anything that could steer a terminal.
+/// A text without anything that could steer its reader's eye or terminal, as UTF-8.
+std::string legible(std::string_view text);
+
+/// The same in the characters of the locale.
 std::string printable(std::string_view text);
 
 /// Returns whether the locale's characters are UTF-8.

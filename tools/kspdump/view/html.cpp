@@ -1,0 +1,435 @@
+// Pages for a browser: one file that needs nothing else, and shows its tables without scripts too.
+
+#include <algorithm>
+#include <charconv>
+#include <cmath>
+#include <ctime>
+#include <limits>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "snapshot/header.h"
+#include "tools/kspdump/view/forms.h"
+#include "tools/kspdump/view/page/page.h"
+#include "tools/kspdump/view/page/picture.h"
+#include "tools/kspdump/view/text.h"
+
+namespace kspdump {
+
+namespace {
+
+constexpr auto kMarkup = Field::Form::kMarkup;
+constexpr double kMissing = std::numeric_limits<double>::quiet_NaN();
+
+/// Now, for people everywhere.
+std::string timeOfReading() {
+  const std::time_t now = std::time(nullptr);
+  std::tm utc = {};
+  char text[32];
+  gmtime_r(&now, &utc);
+  return {text, std::strftime(text, sizeof text, "%Y-%m-%d %H:%M UTC", &utc)};
+}
+
+/// A number's digits, in groups of three that the style sets apart.
+std::string grouped(std::string_view number) {
+  std::string out;
+  const bool hasSign = number.starts_with('-') || number.starts_with('+');
+  const size_t whole = std::min(number.find('.'), number.size());
+  for (size_t i = 0; i < whole; ++i) {
+    const bool isHead = (whole - i) % 3 != 0 || i <= (hasSign ? 1 : 0);
+    if (!isHead) out += "<i>";
+    out += number[i];
+    if ((whole - i) % 3 == 1 && out.find("<i>") != out.npos) out += "</i>";
+  }
+  return out.append(number.substr(whole));
+}
+
+std::string decimal(std::optional<Wide> number, bool withSign = false) {
+  if (!number) return "";
+  return grouped((withSign && *number > Wide() ? "+" : "") + number->text());
+}
+
+std::string rounded(double number, int digits) {
+  char text[400];
+  return grouped({text, std::to_chars(text, std::end(text), number, std::chars_format::fixed, digits).ptr});
+}
+
+/// What a value grew by, of a hundred of what it was.
+std::string percent(std::optional<Wide> before, std::optional<Wide> after) {
+  if (!before || !after || *before == Wide()) return "";
+  const double change = 100 * static_cast<double>(*after - *before) / static_cast<double>(*before);
+  return (change > 0 ? "+" : "") + rounded(change, 1);
+}
+
+/// Appends a JSON text in which nothing is markup.
+void appendSafeJson(std::string& out, std::string_view text) {
+  std::string json;
+  appendJson(json, legible(text));
+  for (const char c : json) {
+    if (c == '<') {
+      out += "\\u003c";
+    } else {
+      out += c;
+    }
+  }
+}
+
+/// Appends a value for the page's script, which rounds numbers above 2^53: these are texts.
+void appendValue(std::string& out, uint64_t value) {
+  constexpr uint64_t kGreatestExact = uint64_t{1} << 53;
+  const char* const quote = value > kGreatestExact ? "\"" : "";
+  out += quote;
+  appendNumber(out, value);
+  out += quote;
+}
+
+/// What a page can be about; each has its columns.
+enum class About { kCapture, kDifference, kTrend, kSnapshot };
+
+struct Column {
+  std::string_view title;
+  std::string_view classes;
+};
+using Columns = std::initializer_list<Column>;
+
+std::string_view nameOf(About about) {
+  switch (about) {
+    case About::kCapture:
+      return "capture";
+    case About::kDifference:
+      return "difference";
+    case About::kTrend:
+      return "trend";
+    case About::kSnapshot:
+      break;
+  }
+  return "snapshot";
+}
+
+Columns columnsOf(About about) {
+  static constexpr Column kKey = {"Key", "number key"};
+  static constexpr Column kName = {"Name", ""};
+  static constexpr Column kElements = {"Elements", ""};
+  static constexpr Column kCourse = {"Course", ""};
+  static const Columns kCapture = {kKey, kName, {"Value or sum", "number"}, kElements};
+  static const Columns kDifference = {kKey,
+                                      kName,
+                                      {"Old", "number spare"},
+                                      {"New", "number spare"},
+                                      {"Change", "number"},
+                                      {"%", "number"},
+                                      kElements};
+  static const Columns kTrend = {kKey,
+                                 kName,
+                                 {"First", "number spare"},
+                                 {"Last", "number"},
+                                 {"Least", "number spare"},
+                                 {"Greatest", "number spare"},
+                                 {"Change", "number spare"},
+                                 {"%", "number"},
+                                 kCourse};
+  static const Columns kSnapshot = {
+      {"No.", "number key"}, {"Field", ""},      {"First", "number spare"}, {"Last", "number spare"},
+      {"Least", "number"},   {"Mean", "number"}, {"Greatest", "number"},    kCourse};
+  switch (about) {
+    case About::kCapture:
+      return kCapture;
+    case About::kDifference:
+      return kDifference;
+    case About::kTrend:
+      return kTrend;
+    case About::kSnapshot:
+      break;
+  }
+  return kSnapshot;
+}
+
+class Html : public View {
+ public:
+  using View::View;
+
+  void head() override {
+    const std::string scripts = std::string(kChartScript.hash).append(" ").append(kPageScript.hash);
+    part("head", {{"scriptHashes", scripts, kMarkup},
+                  {"styleHashes", kPageStyle.hash, kMarkup},
+                  {"style", kPageStyle.text, kMarkup}});
+  }
+
+  void tail() override {
+    part("tail", {{"charts", kChartScript.text, kMarkup}, {"script", kPageScript.text, kMarkup}});
+  }
+
+  /// What was found in a capture stands above its records, and is known when they come again.
+  [[nodiscard]] bool measures(const Capture& capture) const override {
+    return capture.kind != Kind::kSnapshot;
+  }
+
+  void begin(Capture& capture) override {
+    isSnapshot_ = capture.kind == Kind::kSnapshot;
+    if (isSnapshot_) {
+      series_ = {};
+      series_.begin(capture);
+    } else {
+      beginSection(About::kCapture, capture.source, {&capture, 1});
+    }
+  }
+
+  void records(std::span<const Record> records) override {
+    if (isSnapshot_) return series_.records(records);
+    for (const Record& record : records) {
+      points_.assign(1, record.values);
+      row(About::kCapture, record.key, record.name, record.isArray);
+    }
+  }
+
+  void end(Capture& capture) override {
+    if (isSnapshot_) {
+      series_.end(capture);
+      snapshot();
+    }
+    part("section-end");
+  }
+
+  void difference(const Series& series) override {
+    head();
+    showChanges(About::kDifference, series, " → ");
+    tail();
+  }
+
+  void trend(const Series& series) override {
+    head();
+    showChanges(About::kTrend, series, " … ");
+    tail();
+  }
+
+  [[nodiscard]] bool showsFindings() const override { return true; }
+
+ private:
+  void part(std::string_view name, std::initializer_list<Field> fields = {}) {
+    appendPart(sink_.text, name, fields);
+    sink_.offer();
+  }
+
+  void beginSection(About about, const std::string& heading, std::span<const Capture> captures) {
+    uint64_t bytes = 0;
+    uint64_t records = 0;
+    uint64_t shown = 0;
+    uint64_t findings = 0;
+    for (const Capture& capture : captures) {
+      bytes += capture.size;
+      records += capture.recordCount;
+      shown += capture.shownCount;
+      findings += capture.findings.size() + capture.furtherFindings;
+    }
+    const bool isSnapshot = about == About::kSnapshot;
+    std::string counts = captures.size() > 1 ? counted(captures.size(), "capture") + ", " : "";
+    counts += counted(bytes, "byte") + ", ";
+    counts += isSnapshot ? counted(series_.points(), "interval") : counted(records, "record");
+    if (shown != records && !isSnapshot) counts += ", " + std::to_string(shown) + " shown";
+    counts += findings == 0 ? ", no findings" : ", " + counted(findings, "finding");
+    part("section", {{"heading", heading},
+                     {"kind", kindTitle(captures.front().kind)},
+                     {"counts", counts},
+                     {"time", timeOfReading()},
+                     {"version", KSP_VERSION}});
+    if (const Bytes header = captures.front().header; !header.empty()) {
+      const ksp::SnapshotHeader reader(header.data());
+      if (reader.hasTitle()) part("title", {{"title", reader.title()}});
+    }
+    if (captures.size() > 1) listSources(captures);
+    if (findings != 0) listFindings(captures);
+
+    std::string json = "{\"view\":\"";
+    json.append(nameOf(about)).append("\",\"kind\":\"").append(kindName(captures.front().kind));
+    json += "\",\"points\":[";
+    for (size_t i = 0; i < (isSnapshot ? series_.points() : captures.size()); ++i) {
+      if (i != 0) json += ',';
+      if (isSnapshot) {
+        appendNumber(json, series_.recordNumber(i));
+      } else {
+        appendSafeJson(json, captures[i].source);
+      }
+    }
+    json += "]}";
+    part("table", {{"about", json, kMarkup}});
+    for (const Column& column : columnsOf(about)) {
+      part("column", {{"class", column.classes}, {"title", column.title}});
+    }
+    part("rows");
+  }
+
+  void listSources(std::span<const Capture> captures) {
+    part("sources", {{"count", std::to_string(captures.size())}});
+    for (size_t i = 0; i < captures.size(); ++i) {
+      const Capture& capture = captures[i];
+      part("source", {{"number", std::to_string(i + 1)},
+                      {"source", capture.source},
+                      {"bytes", grouped(std::to_string(capture.size)), kMarkup},
+                      {"records", grouped(std::to_string(capture.recordCount)), kMarkup},
+                      {"findings", std::to_string(capture.findings.size() + capture.furtherFindings)}});
+    }
+    part("sources-end");
+  }
+
+  void listFindings(std::span<const Capture> captures) {
+    part("findings");
+    for (const Capture& capture : captures) {
+      for (const Finding& finding : capture.findings) {
+        part("finding", {{"source", capture.source},
+                         {"offset", std::to_string(finding.offset)},
+                         {"reason", finding.reason}});
+      }
+      if (capture.furtherFindings != 0) {
+        part("further",
+             {{"source", capture.source}, {"count", counted(capture.furtherFindings, "further finding")}});
+      }
+    }
+    part("findings-end");
+  }
+
+  void showChanges(About about, const Series& series, const char* between) {
+    const std::vector<Capture>& captures = series.captures();
+    beginSection(about, captures.front().source + between + captures.back().source, captures);
+    for (const size_t track : series.tracksInOrder()) {
+      if (!series.changes(track)) continue;
+      points_.clear();
+      for (size_t point = 0; point < series.points(); ++point) points_.push_back(series.values(track, point));
+      const Track& of = series.tracks()[track];
+      row(about, of.key, of.name, of.isArray);
+    }
+    part("section-end");
+  }
+
+  /// A row a field, and of an array a row an element, unless it has too many for a chart.
+  void snapshot() {
+    constexpr uint32_t kMostLines = 16;
+    beginSection(About::kSnapshot, series_.captures().front().source, series_.captures());
+    for (size_t track = 0; track < series_.tracks().size(); ++track) {
+      const Track& of = series_.tracks()[track];
+      const bool isApart = of.isArray && of.elements <= kMostLines;
+      for (uint32_t element = 0; element < (isApart ? of.elements : 1); ++element) {
+        points_.clear();
+        for (size_t point = 0; point < series_.points(); ++point) {
+          const Values values = series_.values(track, point);
+          points_.push_back(isApart ? values.only(element) : values);
+        }
+        row(About::kSnapshot, of.key, isApart ? of.name + "_" + std::to_string(element) : of.name,
+            of.isArray && !isApart);
+      }
+    }
+  }
+
+  /// A row with the values of `points_`.
+  void row(About about, uint32_t key, std::string_view name, bool isArray) {
+    const bool isSeries = about == About::kTrend || about == About::kSnapshot;
+    part("row",
+         {{"class", isArray || isSeries ? "opens" : ""}, {"key", std::to_string(key)}, {"name", name}});
+    std::vector<std::string> numbers = numbersOf(about);
+    auto column = columnsOf(about).begin() + 2;
+    for (const std::string& number : numbers) {
+      part("number", {{"class", (column++)->classes}, {"number", number, kMarkup}});
+    }
+    uint32_t elements = 0;
+    for (const Values& values : points_) elements = std::max(elements, values.size());
+    std::string json = "{\"key\":";
+    appendNumber(json, key);
+    json += ",\"name\":";
+    appendSafeJson(json, name);
+    appendValues(json, isArray);
+    part("row-end", {{"elements", isArray ? std::to_string(elements) : ""},
+                     {"picture", pictureOf(about, isArray, elements), kMarkup},
+                     {"series", json, kMarkup}});
+  }
+
+  void appendValues(std::string& json, bool isArray) {
+    json += ",\"values\":[";
+    for (size_t i = 0; i < points_.size(); ++i) {
+      const Values& values = points_[i];
+      if (i != 0) json += ',';
+      if (values.empty()) {
+        json += "null";
+        continue;
+      }
+      if (isArray) json += '[';
+      for (uint32_t element = 0; element < values.size(); ++element) {
+        if (element != 0) json += ',';
+        appendValue(json, values[element]);
+      }
+      if (isArray) json += ']';
+    }
+    json += "]}";
+  }
+
+  /// What stands in a row's cells of numbers.
+  std::vector<std::string> numbersOf(About about) {
+    totals_.clear();
+    for (const Values& values : points_) {
+      totals_.push_back(values.empty() ? std::nullopt : std::optional(sum(values)));
+    }
+    const auto& first = totals_.front();
+    const auto& last = totals_.back();
+    std::optional<Wide> change;
+    if (first && last) change = *last - *first;
+    if (about == About::kCapture) return {decimal(first)};
+    if (about == About::kDifference) {
+      return {decimal(first), decimal(last), decimal(change, true), percent(first, last)};
+    }
+    std::optional<Wide> least;
+    std::optional<Wide> greatest;
+    Wide all;
+    unsigned present = 0;
+    for (const auto& total : totals_) {
+      if (!total) continue;
+      if (!least || *total < *least) least = total;
+      if (!greatest || *total > *greatest) greatest = total;
+      all += *total;
+      ++present;
+    }
+    if (about == About::kTrend) {
+      return {decimal(first),    decimal(last),         decimal(least),
+              decimal(greatest), decimal(change, true), percent(first, last)};
+    }
+    const double mean = static_cast<double>(all) / std::max(present, 1U);
+    return {decimal(first), decimal(last), decimal(least),
+            rounded(mean, mean < 10     ? 2
+                          : mean < 1000 ? 1
+                                        : 0),
+            decimal(greatest)};
+  }
+
+  std::string pictureOf(About about, bool isArray, uint32_t elements) {
+    drawn_.clear();
+    if (about == About::kTrend || about == About::kSnapshot) {
+      for (const auto& total : totals_) drawn_.push_back(total ? static_cast<double>(*total) : kMissing);
+      return drawLine(drawn_);
+    }
+    if (!isArray) return "";
+    const Values& from = points_.front();
+    const Values& to = points_.back();
+    for (uint32_t i = 0; i < elements; ++i) {
+      if (about == About::kCapture) {
+        drawn_.push_back(static_cast<double>(to[i]));
+      } else {
+        const bool isInBoth = i < from.size() && i < to.size();
+        drawn_.push_back(isInBoth ? static_cast<double>(Wide(to[i]) - Wide(from[i])) : kMissing);
+      }
+    }
+    return drawBars(drawn_);
+  }
+
+  bool isSnapshot_ = false;
+  Series series_;
+  // Of the row that is made; kept for the room they have.
+  std::vector<Values> points_;
+  std::vector<std::optional<Wide>> totals_;
+  std::vector<double> drawn_;
+};
+
+}  // namespace
+
+std::unique_ptr<View> makeHtml(const ViewOptions& /*options*/, Sink& sink) {
+  return std::make_unique<Html>(sink);
+}
+
+}  // namespace kspdump

@@ -1,0 +1,70 @@
+#include "tools/kspdump/view/page/page.h"
+
+#include <algorithm>
+#include <stdexcept>
+
+#include "tools/kspdump/view/text.h"
+
+namespace kspdump {
+
+namespace {
+
+constexpr std::string_view kOpening = "{{";
+constexpr std::string_view kClosing = "}}";
+
+/// The text of a part.
+std::string_view partOf(std::string_view page, std::string_view part) {
+  constexpr std::string_view kMark = "<!-- part ";
+  const std::string line = std::string(kMark).append(part).append(" -->\n");
+  const size_t at = page.find(line);
+  if (at == page.npos) throw std::logic_error("page.html has no part " + std::string(part));
+  page.remove_prefix(at + line.size());
+  return page.substr(0, page.find(kMark));
+}
+
+}  // namespace
+
+void appendHtml(std::string& out, std::string_view text) {
+  for (const char c : legible(text)) {
+    switch (c) {
+      case '&':
+        out += "&amp;";
+        break;
+      case '<':
+        out += "&lt;";
+        break;
+      case '>':
+        out += "&gt;";
+        break;
+      case '"':
+        out += "&quot;";
+        break;
+      case '\'':
+        out += "&#39;";
+        break;
+      default:
+        out += c;
+    }
+  }
+}
+
+void appendPart(std::string& out, std::string_view part, std::initializer_list<Field> fields) {
+  std::string_view rest = partOf(kPageHtml.text, part);
+  for (size_t at = rest.find(kOpening); at != rest.npos; at = rest.find(kOpening)) {
+    out += rest.substr(0, at);
+    rest.remove_prefix(at + kOpening.size());
+    const std::string_view name = rest.substr(0, rest.find(kClosing));
+    rest.remove_prefix(name.size() + kClosing.size());
+    const auto* const field =
+        std::find_if(fields.begin(), fields.end(), [&](const Field& each) { return each.name == name; });
+    if (field == fields.end()) throw std::logic_error("nobody fills in " + std::string(name));
+    if (field->form == Field::Form::kMarkup) {
+      out += field->value;
+    } else {
+      appendHtml(out, field->value);
+    }
+  }
+  out += rest;
+}
+
+}  // namespace kspdump

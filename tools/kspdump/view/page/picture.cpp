@@ -1,0 +1,107 @@
+#include "tools/kspdump/view/page/picture.h"
+
+#include <algorithm>
+#include <charconv>
+#include <cmath>
+#include <limits>
+#include <string_view>
+
+namespace kspdump {
+
+namespace {
+
+/// Pictures are drawn in a field of `kWidth` by `kHeight`.
+constexpr int kWidth = 128;
+constexpr int kHeight = 24;
+
+void appendPoint(std::string& path, char command, double x, double y) {
+  char text[64];
+  char* at = text;
+  *at++ = command;
+  at = std::to_chars(at, std::end(text), static_cast<int>(std::lround(x))).ptr;
+  *at++ = ' ';
+  at = std::to_chars(at, std::end(text), static_cast<int>(std::lround(y * 4)) / 4.0).ptr;
+  path.append(text, at);
+}
+
+std::string picture(std::string_view paths) {
+  return "<svg viewBox=\"0 0 " + std::to_string(kWidth) + " " + std::to_string(kHeight) +
+         "\" preserveAspectRatio=\"none\" aria-hidden=\"true\">" + std::string(paths) + "</svg>";
+}
+
+}  // namespace
+
+std::string drawBars(const std::vector<double>& values) {
+  constexpr size_t kMostBars = 64;
+  double greatest = 0;
+  double least = 0;
+  for (const double value : values) {
+    greatest = std::max(greatest, value);
+    least = std::min(least, value);
+  }
+  const double range = greatest > least ? greatest - least : 1;
+  const double base = kHeight * greatest / range;
+  const size_t count = std::min(values.size(), kMostBars);
+  const double step = static_cast<double>(kWidth) / static_cast<double>(count);
+  std::string up;
+  std::string down;
+  for (size_t i = 0; i < count; ++i) {
+    // Where there are more values than bars, a bar shows the one farthest from nothing.
+    double value = 0;
+    for (size_t at = i * values.size() / count; at < (i + 1) * values.size() / count; ++at) {
+      if (std::abs(values[at]) > std::abs(value)) value = values[at];
+    }
+    if (value == 0 || std::isnan(value)) continue;
+    std::string& path = value > 0 ? up : down;
+    // What is there at all is seen.
+    const double height = std::max(std::abs(value) * kHeight / range, 1.0);
+    const double left = static_cast<double>(i) * step;
+    appendPoint(path, 'M', left, base);
+    appendPoint(path, 'L', left, value > 0 ? base - height : base + height);
+    appendPoint(path, 'L', left + std::max(step - 1, 1.0), value > 0 ? base - height : base + height);
+    appendPoint(path, 'L', left + std::max(step - 1, 1.0), base);
+  }
+  std::string paths;
+  if (!up.empty()) paths += "<path class=\"up\" d=\"" + up + "\"/>";
+  if (!down.empty()) paths += "<path class=\"down\" d=\"" + down + "\"/>";
+  return picture(paths);
+}
+
+std::string drawLine(const std::vector<double>& values) {
+  constexpr size_t kMostColumns = kWidth / 2;
+  double least = std::numeric_limits<double>::infinity();
+  double greatest = -least;
+  for (const double value : values) {
+    if (std::isnan(value)) continue;
+    least = std::min(least, value);
+    greatest = std::max(greatest, value);
+  }
+  std::string path;
+  bool isDrawing = false;
+  const double span = values.size() > 1 ? static_cast<double>(values.size() - 1) : 1;
+  const auto add = [&](size_t at) {
+    if (std::isnan(values[at])) {
+      isDrawing = false;
+      return;
+    }
+    const double height = greatest > least ? (values[at] - least) / (greatest - least) : 0.5;
+    appendPoint(path, isDrawing ? 'L' : 'M', static_cast<double>(at) * kWidth / span,
+                1 + (kHeight - 2) * (1 - height));
+    isDrawing = true;
+  };
+  if (values.size() <= 2 * kMostColumns) {
+    for (size_t at = 0; at < values.size(); ++at) add(at);
+  } else {
+    for (size_t column = 0; column < kMostColumns; ++column) {
+      const auto first = values.begin() + static_cast<std::ptrdiff_t>(column * values.size() / kMostColumns);
+      const auto last =
+          values.begin() + static_cast<std::ptrdiff_t>((column + 1) * values.size() / kMostColumns);
+      const auto [low, high] = std::minmax_element(first, last);
+      add(static_cast<size_t>(std::min(low, high) - values.begin()));
+      if (low != high) add(static_cast<size_t>(std::max(low, high) - values.begin()));
+    }
+  }
+  return picture("<path class=\"line\" d=\"" + path + "\"/>");
+}
+
+}  // namespace kspdump

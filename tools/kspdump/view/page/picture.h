@@ -1,0 +1,16 @@
+#pragma once
+
+#include <string>
+#include <vector>
+
+namespace kspdump {
+
+/// Small pictures for a table's cells, as SVG. Values that are not numbers are missing.
+
+/// A bar a value, upwards or, where it is negative, downwards.
+std::string drawBars(const std::vector<double>& values);
+
+/// A line through the values. Of more values than columns it passes each column's least and greatest.
+std::string drawLine(const std::vector<double>& values);
+
+}  // namespace kspdump
