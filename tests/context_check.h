@@ -1,8 +1,10 @@
 #pragma once
 
 #include <algorithm>
+#include <cstddef>
 #include <cstdint>
 #include <cstdlib>
+#include <cstring>
 #include <string>
 #include <string_view>
 #include <type_traits>
@@ -53,9 +55,13 @@ inline bool sameSummary(const GenericParserContext&, const GenericParserContext&
   return true;
 }
 inline bool sameSummary(const KSPParseContext& one, const KSPParseContext& other) {
-  const auto* const bytes = reinterpret_cast<const char*>(&one);
-  return std::equal(bytes + sizeof one.entries, bytes + sizeof one,
-                    reinterpret_cast<const char*>(&other) + sizeof other.entries);
+  const auto same = [&](size_t from, size_t to) {
+    return std::memcmp(reinterpret_cast<const char*>(&one) + from,
+                       reinterpret_cast<const char*>(&other) + from, to - from) == 0;
+  };
+  // Nothing says what lies between the words and the double words.
+  constexpr size_t kWordsEnd = offsetof(KSPParseContext, bytesPerPage) + sizeof one.bytesPerPage;
+  return same(sizeof one.entries, kWordsEnd) && same(offsetof(KSPParseContext, hostReads), sizeof one);
 }
 
 /// Parses a stream twice into one context, the second time from an odd address, and tells whether result,

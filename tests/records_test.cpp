@@ -28,7 +28,8 @@ std::string told(Records records) {
     out << record.offset << ' ' << record.key << ' ' << name.view().data() << ' ' << record.announced << '/'
         << record.configured << (record.counts ? "" : " passed-over") << (record.isArray ? " array" : "")
         << (record.isListed() ? " listed" : "") << (record.isAsConfigured() ? "" : " other-size");
-    EXPECT_TRUE(record.row == nullptr || record.row->key == record.key);
+    EXPECT_TRUE(record.row == nullptr ||
+                (record.row->key == record.key && record.row->width == record.elements.width()));
     for (const uint64_t value : record.elements) out << ' ' << value;
     out << '\n';
   }
