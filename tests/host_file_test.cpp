@@ -1,16 +1,37 @@
 // Host files: what they may say, and the one line that names each fault.
 
 #include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
 
 #include <filesystem>
 #include <fstream>
 
 #include "platform/host/conditions.h"
 #include "platform/host/host_file.h"
+#include "platform/host/screen.h"
 
 namespace {
 
 namespace fs = std::filesystem;
+
+class Folder : public testing::Test {
+ protected:
+  Folder() : folder_(fs::path(testing::TempDir()) / ("host" + std::to_string(getpid()))) {
+    fs::create_directories(folder_);
+  }
+  ~Folder() override { fs::remove_all(folder_); }
+
+  std::string path(const std::string& name) const { return folder_ / name; }
+
+  /// Writes a file of one line.
+  void write(const std::string& name, const std::string& text) {
+    fs::create_directories((folder_ / name).parent_path());
+    std::ofstream(folder_ / name) << text << '\n';
+  }
+
+  const fs::path folder_;
+};
 
 TEST(HostFile, EveryExampleIsAccepted) {
   int examples = 0;
@@ -77,25 +98,85 @@ TEST(HostFile, FaultsNameFileLineAndReason) {
 
 TEST(HostFile, UnreadableFilesSayWhy) {
   EXPECT_EQ(faultOf("no/such/file"), "no/such/file: cannot be read: No such file or directory");
-  EXPECT_EQ(faultOf("/"), "/: cannot be read: Is a directory");
-  EXPECT_EQ(faultOf("/dev/zero"), "/dev/zero: cannot be read: it is larger than 1 MiB");
+  EXPECT_EQ(faultOf("/"), "/: cannot be read: it is not a regular file");
+  EXPECT_EQ(faultOf("/dev/zero"), "/dev/zero: cannot be read: it is not a regular file");
+  EXPECT_EQ(faultOf("no/such/\x1b\xc2\x9b\x9b\xe2\x82\xac"),
+            "no/such/????\xe2\x82\xac: cannot be read: No such file or directory")
+      << "no control character is shown, the euro sign is";
 }
 
-class Conditions : public testing::Test {
- protected:
-  Conditions() : folder_(fs::path(testing::TempDir()) / ("conditions" + std::to_string(getpid()))) {}
-  ~Conditions() override { fs::remove_all(folder_); }
+TEST_F(Folder, OnlyRegularFilesOfSixtyFourKibibytesAreRead) {
+  const std::string comment = "# " + std::string(100, '.') + "\n[activity]\nidentifier = \"x\"\n#";
+  write("longest", comment + std::string(65536 - 1 - comment.size(), ' '));
+  EXPECT_EQ(faultOf(path("longest")), "accepted");
+  write("longer", comment + std::string(65536 - comment.size(), ' '));
+  EXPECT_EQ(faultOf(path("longer")), path("longer") + ": cannot be read: it is larger than 64 KiB");
+  ASSERT_EQ(mkfifo(path("pipe").c_str(), 0600), 0);
+  EXPECT_EQ(faultOf(path("pipe")), path("pipe") + ": cannot be read: it is not a regular file");
+  fs::create_symlink("nowhere", folder_ / "link");
+  EXPECT_EQ(faultOf(path("link")), path("link") + ": cannot be read: it is a link that leads nowhere");
+}
 
-  void write(const std::string& name, const std::string& text) {
-    const fs::path file = folder_ / name;
-    fs::create_directories(file.parent_path());
-    std::ofstream(file) << text << '\n';
+// Each place is asked in turn; one that holds a wrong file is not passed over.
+TEST_F(Folder, TheHostFileIsLookedForInThreePlaces) {
+  const auto writeHost = [&](const char* name) {
+    write(name, std::string("[activity]\nidentifier = \"") + name + "\"");
+  };
+  const auto found = [&](const char* named, const char* credentials) {
+    try {
+      return host::findHostFile(named, credentials, path("system").c_str()).activity.identifier;
+    } catch (const host::HostFileError& fault) {
+      return std::string(fault.what()).substr(folder_.string().size() + 1);
+    }
+  };
+  const std::string credentials = path("credentials");
+  EXPECT_EQ(found(nullptr, nullptr), "");
+  EXPECT_EQ(found("", credentials.c_str()), "");
+  writeHost("system");
+  EXPECT_EQ(found("", credentials.c_str()), "system");
+  fs::create_directories(credentials);
+  std::ofstream(credentials + "/ksp-host.toml").close();
+  EXPECT_EQ(found(nullptr, credentials.c_str()), "system") << "an empty credential stands for none";
+  writeHost("credentials/ksp-host.toml");
+  EXPECT_EQ(found(nullptr, credentials.c_str()), "credentials/ksp-host.toml");
+  EXPECT_EQ(found(path("named").c_str(), credentials.c_str()),
+            "named: cannot be read: No such file or directory");
+  writeHost("named");
+  EXPECT_EQ(found(path("named").c_str(), credentials.c_str()), "named");
+  fs::remove(folder_ / "system");
+  fs::create_symlink("nowhere", folder_ / "system");
+  EXPECT_EQ(found(nullptr, nullptr), "system: cannot be read: it is a link that leads nowhere");
+}
+
+TEST(HostFile, WhatTheParserCannotTakeIsRefusedBeforeItSeesIt) {
+  const struct {
+    std::string text;
+    std::optional<unsigned> line;
+  } cases[] = {
+      {"a.b.c.d.e.f.g.h = 1.5\n", std::nullopt},
+      {"a.b.c.d.e.f.g.h.i = 1\n", 1},
+      {"a = 1\n\n[a.b.c.d.e.f.g.h.i]\n", 3},
+      {"a = [1.5, 1.5, 1.5, 1.5, 1.5, 1.5, 1.5, 1.5, 1.5]", std::nullopt},
+      {"a = [[[[[[[[ ]]]]]]]]\nb = [[[[[[[[ ]]]]]]]]", std::nullopt},
+      {"a = [\n[[[\n{ b = [[[[", 3},
+      {"a.b = 1 # . . . . . . . . . [[[[[[[[[\nc = '.........' # [\n", std::nullopt},
+      {R"(a = "\"........." # ")", std::nullopt},
+      {"a = '\\' # '\na.b.c.d.e.f.g.h.i = 1", 2},
+      {"a = \"\" # [[[[[[[[[\nb = ''\n\n\"\"\"\"\"\" = 1", 4},
+      {"a = '''b'''", 1},
+      {"a = \".........\na.b.c.d.e.f.g.h.i = 1", 2},
+      {std::string(300000, ']') + std::string(8, '['), std::nullopt},
+      {"\"", std::nullopt},
+      {"\"\\", std::nullopt},
+      {"\xEF\xBB\xBF a = '' # \xC3\xA9\nb = '\xC3\xA9'", 2},
+  };
+  for (const auto& [text, line] : cases) {
+    const auto objection = host::objectionTo(text);
+    EXPECT_EQ(objection ? std::optional(objection->line) : std::nullopt, line) << text.substr(0, 80);
   }
+}
 
-  const fs::path folder_;
-};
-
-TEST_F(Conditions, BatteryCountsWhileItDischargesAndNothingElseSupplies) {
+TEST_F(Folder, BatteryCountsWhileItDischargesAndNothingElseSupplies) {
   EXPECT_FALSE(host::runsOnBattery(folder_));
   write("BAT0/type", "Battery");
   write("BAT0/status", "Discharging");
@@ -110,7 +191,7 @@ TEST_F(Conditions, BatteryCountsWhileItDischargesAndNothingElseSupplies) {
   EXPECT_FALSE(host::runsOnBattery(folder_)) << "a mouse's battery";
 }
 
-TEST_F(Conditions, PressureIsTheTenSecondAverageOfSomeTask) {
+TEST_F(Folder, PressureIsTheTenSecondAverageOfSomeTask) {
   EXPECT_EQ(host::ioPressurePercent(folder_ / "io"), std::nullopt);
   write("io",
         "some avg10=12.50 avg60=3.00 avg300=1.00 total=9\nfull avg10=99.00 avg60=0.00 avg300=0.00 total=1");

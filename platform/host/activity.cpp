@@ -194,7 +194,7 @@ void RegisterActivity(const char* identifier, const ActivityCriteria*, ActivityH
   host::bringUp();
   const host::HostFile& file = host::hostFile();
   const host::ActivitySettings& declared = file.activity;
-  if (declared.identifier != identifier) {
+  if (!file.name.empty() && declared.identifier != identifier) {
     endStart(
         {file.name, declared.identifierLine,
          "the host declares activity '" + declared.identifier + "', but none named '" + identifier + "'"});

@@ -1,6 +1,8 @@
 #include "platform/host/host_file.h"
 
+#include <fcntl.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include <toml++/toml.h>
 #include <algorithm>
@@ -9,16 +11,17 @@
 #include <cstdlib>
 #include <cstring>
 #include <limits>
-#include <memory>
 
-#include "default_host.h"
+#include "platform/host/log.h"
+#include "platform/host/screen.h"
 
 namespace host {
 
 namespace {
 
 constexpr char kSystemFile[] = "/etc/brellium/host.toml";
-constexpr size_t kGreatestFileSize = size_t{1} << 20;
+constexpr char kCredential[] = "/ksp-host.toml";
+constexpr size_t kGreatestFileSize = size_t{64} << 10;
 constexpr uint32_t kGreatestSeconds = 366 * 24 * 60 * 60;
 
 /// The controllers that the host can emulate, and the driver method through which each takes its commands.
@@ -205,22 +208,55 @@ std::string faultLine(std::string_view file, unsigned line, std::string_view fau
   std::string text(file);
   if (line != 0) text.append(":").append(std::to_string(line));
   text.append(": ").append(fault);
-  // Names and keys come from outside; a terminal must not be steered by them.
-  std::replace_if(
-      text.begin(), text.end(), [](unsigned char c) { return c < ' ' || c == 0x7F; }, '?');
+  makePrintable(text);
   return text;
+}
+
+/// A file descriptor, closed at the end of its scope.
+class OpenFile {
+ public:
+  explicit OpenFile(const std::string& path)
+      : descriptor_(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY | O_NONBLOCK)) {}
+  OpenFile(const OpenFile&) = delete;
+  ~OpenFile() {
+    if (descriptor_ >= 0) close(descriptor_);
+  }
+
+  int descriptor() const { return descriptor_; }
+
+ private:
+  const int descriptor_;
+};
+
+bool isLink(const std::string& path) {
+  struct stat status = {};
+  return lstat(path.c_str(), &status) == 0 && S_ISLNK(status.st_mode);
 }
 
 std::string readWhole(const std::string& path) {
   const auto fail = [&](const char* reason) {
     throw HostFileError(path, 0, std::string("cannot be read: ") + reason);
   };
-  const std::unique_ptr<std::FILE, int (*)(std::FILE*)> file(std::fopen(path.c_str(), "re"), std::fclose);
-  if (!file) fail(std::strerror(errno));
+  // Opening a pipe or a device must not wait for its other end; neither is read.
+  const OpenFile file(path);
+  if (file.descriptor() < 0) {
+    if (errno == ENOENT && isLink(path)) fail("it is a link that leads nowhere");
+    fail(std::strerror(errno));
+  }
+  struct stat status = {};
+  if (fstat(file.descriptor(), &status) != 0) fail(std::strerror(errno));
+  if (!S_ISREG(status.st_mode)) fail("it is not a regular file");
   std::string text(kGreatestFileSize + 1, '\0');
-  text.resize(std::fread(text.data(), 1, text.size(), file.get()));
-  if (std::ferror(file.get()) != 0) fail(std::strerror(errno));
-  if (text.size() > kGreatestFileSize) fail("it is larger than 1 MiB");
+  size_t size = 0;
+  while (size < text.size()) {
+    const ssize_t got = read(file.descriptor(), text.data() + size, text.size() - size);
+    if (got < 0 && errno == EINTR) continue;
+    if (got < 0) fail(std::strerror(errno));
+    if (got == 0) break;
+    size += static_cast<size_t>(got);
+  }
+  if (size > kGreatestFileSize) fail("it is larger than 64 KiB");
+  text.resize(size);
   return text;
 }
 
@@ -230,6 +266,7 @@ HostFileError::HostFileError(std::string_view file, unsigned line, std::string_v
     : std::runtime_error(faultLine(file, line, fault)) {}
 
 HostFile parseHostFile(std::string_view text, std::string_view name) {
+  if (const auto objection = objectionTo(text)) throw HostFileError(name, objection->line, objection->fault);
   try {
     return readHostFile(name, toml::parse(text, name));
   } catch (const toml::parse_error& error) {
@@ -241,15 +278,22 @@ HostFile loadHostFile(const std::string& path) {
   return parseHostFile(readWhole(path), path);
 }
 
+HostFile findHostFile(const char* named, const char* credentials, const char* systemFile) {
+  if (named != nullptr && *named != 0) return loadHostFile(named);
+  struct stat status = {};
+  if (credentials != nullptr) {
+    // An empty one stands for none: a service manager may have to put something there in any case.
+    const std::string credential = std::string(credentials) + kCredential;
+    if (stat(credential.c_str(), &status) == 0 && status.st_size != 0) return loadHostFile(credential);
+  }
+  if (lstat(systemFile, &status) == 0 || errno != ENOENT) return loadHostFile(systemFile);
+  return {};
+}
+
 const HostFile& hostFile() {
   // Never destroyed: a client may close its connection as late as its own last global object.
-  static const HostFile& file = *new HostFile([] {
-    const char* named = secure_getenv("KSP_HOST_FILE");
-    if (named != nullptr && *named != 0) return loadHostFile(named);
-    struct stat ignored = {};
-    if (stat(kSystemFile, &ignored) == 0 || errno != ENOENT) return loadHostFile(kSystemFile);
-    return parseHostFile(kDefaultHost, "built-in host file");
-  }());
+  static const HostFile& file = *new HostFile(
+      findHostFile(secure_getenv("KSP_HOST_FILE"), secure_getenv("CREDENTIALS_DIRECTORY"), kSystemFile));
   return file;
 }
 

@@ -11,6 +11,7 @@ namespace host {
 
 /// When the activity runs.
 struct ActivitySettings {
+  /// Empty without a host file: any activity then runs by these defaults.
   std::string identifier;
   unsigned identifierLine = 0;
   uint32_t startAfterSeconds = 0;
@@ -46,8 +47,9 @@ struct ControllerSettings {
   std::optional<uint32_t> goneAfterLookups;
 };
 
+/// What a host file says. As it is here, it is what holds on a host without one: no controller.
 struct HostFile {
-  /// Name of the file, for messages.
+  /// Name of the file, for messages; empty without one.
   std::string name;
   ActivitySettings activity;
   YieldSettings yield;
@@ -66,11 +68,17 @@ inline constexpr int kExitConfiguration = 78;
 /// Reads and checks the host file text; `name` stands in messages. Throws HostFileError.
 HostFile parseHostFile(std::string_view text, std::string_view name);
 
-/// Reads and checks a host file. Throws HostFileError, also when it cannot be read.
+/// Reads and checks a host file: a regular file of at most 64 KiB. Throws HostFileError, also when it cannot
+/// be read.
 HostFile loadHostFile(const std::string& path);
 
-/// The host file of this process, read at the first call: the file that $KSP_HOST_FILE names, else
-/// /etc/brellium/host.toml, else the built-in default. Throws HostFileError.
+/// Looks for the host file: the one `named`, else the credential `ksp-host.toml` in the folder `credentials`
+/// unless it is empty, else `systemFile`, a link that leads nowhere included; returns the defaults where
+/// there is none. `named` and `credentials` may be null. Throws HostFileError.
+HostFile findHostFile(const char* named, const char* credentials, const char* systemFile);
+
+/// The host file of this process, looked for at the first call: $KSP_HOST_FILE, then $CREDENTIALS_DIRECTORY,
+/// then /etc/brellium/host.toml. Throws HostFileError.
 const HostFile& hostFile();
 
 /// Writes a fault to standard error, as the one line of a start that ends there.

@@ -1,6 +1,12 @@
 #pragma once
 
+#include <span>
+
 namespace host {
+
+/// Replaces each byte of a text that is no part of a printable UTF-8 character by '?': names from outside
+/// must not steer a terminal.
+void makePrintable(std::span<char> text);
 
 /// Connects to the system's log, and to standard error where that is a terminal or the log has no socket.
 void openLog();
