@@ -44,7 +44,7 @@ PLATFORM_API int32_t OpenServiceConnection(uint32_t service, int32_t process, ui
  * Calls a method of the driver, by number.
  *
  * `input` holds `inputSize` bytes. `*outputSize` is the room at `output` in bytes on entry and the bytes
- * written on return. On failure `output` may have been written all the same.
+ * written on return: 0 when the call is refused. A call that fails may have written all the same.
  */
 PLATFORM_API int32_t CallStructMethod(uint32_t connection, uint32_t method, const void* input,
                                       size_t inputSize, void* output, size_t* outputSize);

@@ -1,15 +1,26 @@
 // The real daemon on the host port, at a terminal: its lines, its exit status, and how it stops.
 
+#include <fcntl.h>
 #include <gtest/gtest.h>
+#include <poll.h>
 #include <pty.h>
 #include <signal.h>
+#include <sys/resource.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/un.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <chrono>
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
+#include <functional>
+#include <map>
+#include <sstream>
 #include <string>
+#include <thread>
 #include <vector>
 
 #include "ksp/connection.h"
@@ -17,115 +28,247 @@
 
 namespace {
 
+namespace fs = std::filesystem;
+using Clock = std::chrono::steady_clock;
 using Lines = std::vector<std::string>;
+using std::chrono::milliseconds;
+
+/// No test waits longer for a daemon, and no one waits for a test.
+constexpr milliseconds kPatience(20000);
+
+/// What a daemon's seconds take, quickened.
+constexpr milliseconds quickened(int seconds) {
+  return milliseconds(10) * seconds;
+}
+
+void changeNothing() {}
 
 /// A run of brellium whose standard error is a terminal that the test reads.
 class Daemon {
  public:
-  explicit Daemon(const std::string& hostFile) {
+  explicit Daemon(const std::string& hostFile, const std::function<void()>& prepare = changeNothing) {
     process_ = forkpty(&terminal_, nullptr, nullptr, nullptr);
     if (process_ == 0) {
       setenv("KSP_HOST_FILE", hostFile.c_str(), 1);
-      setenv("LD_PRELOAD", KSP_QUICK_SLEEP, 1);
+      setenv("LD_PRELOAD", KSP_QUICK_MACHINE, 1);
+      prepare();
       execl(KSP_BRELLIUM, "brellium", "--ignored", nullptr);
       _exit(127);
     }
   }
 
-  /// The next line, without the program's name and process in front; empty at the end.
+  ~Daemon() {
+    if (process_ < 0) return;
+    signal(SIGKILL);
+    exitStatus();
+  }
+
+  /// The next line, without the program's name and process in front; empty at the end. The test fails with
+  /// what it saw when none comes in time.
   std::string line() {
     std::string text;
-    for (char c = 0; read(terminal_, &c, 1) == 1 && c != '\n';) {
+    for (char c = 0; next(c) && c != '\n';) {
       if (c != '\r') text += c;
     }
+    seen_ += "  " + text + "\n";
     const size_t name = text.find("]: ");
     return name == std::string::npos ? text : text.substr(name + 3);
   }
 
-  /// The daemon's own lines up to one that starts with `last`, or all that are left.
-  Lines lines(const std::string& last = "no such line") {
+  /// All lines up to one that starts with `last`, or all that are left.
+  Lines allLines(const std::string& last = "no such line") {
     Lines all;
     for (std::string text = line(); !text.empty(); text = line()) {
-      if (text.starts_with("host: ")) continue;
       all.push_back(text);
       if (text.starts_with(last)) break;
     }
     return all;
   }
 
+  /// The daemon's own among them.
+  Lines lines(const std::string& last = "no such line") {
+    Lines own = allLines(last);
+    std::erase_if(own, [](const std::string& text) { return text.starts_with("host: "); });
+    return own;
+  }
+
+  void type(char key) const { EXPECT_EQ(write(terminal_, &key, 1), 1); }
   void signal(int number) const { kill(process_, number); }
 
+  /// The exit status, or the negative number of the signal that ended it.
   int exitStatus() {
     int status = 0;
-    waitpid(process_, &status, 0);
+    while (waitpid(process_, &status, WNOHANG) == 0) {
+      if (Clock::now() > end_) giveUp("it does not end");
+      std::this_thread::sleep_for(milliseconds(1));
+    }
+    process_ = -1;
     close(terminal_);
     return WIFEXITED(status) ? WEXITSTATUS(status) : -WTERMSIG(status);
   }
 
  private:
+  bool next(char& c) {
+    const auto left = std::chrono::duration_cast<milliseconds>(end_ - Clock::now()).count();
+    pollfd readable = {.fd = terminal_, .events = POLLIN, .revents = 0};
+    if (poll(&readable, 1, static_cast<int>(std::max<long>(left, 0))) == 0)
+      giveUp("its next line does not come");
+    return read(terminal_, &c, 1) == 1;
+  }
+
+  void giveUp(const char* what) {
+    if (end_ != Clock::time_point::max()) ADD_FAILURE() << what << "; it said:\n" << seen_;
+    end_ = Clock::time_point::max() - kPatience;
+    kill(process_, SIGKILL);
+  }
+
   pid_t process_;
   int terminal_ = -1;
+  Clock::time_point end_ = Clock::now() + kPatience;
+  std::string seen_;
 };
 
-/// A host file of the test's own, from behind the heading of the activity's table on.
-class HostFile {
- public:
-  explicit HostFile(const std::string& text) { std::ofstream(name_) << "[activity]\n" << text; }
-  ~HostFile() { std::filesystem::remove(name_); }
+/// A folder of the test's own, with the host file and the machine that the daemon finds.
+class Brellium : public testing::Test {
+ protected:
+  Brellium() : folder_(fs::path(testing::TempDir()) / ("brellium" + std::to_string(getpid()))) {
+    fs::create_directories(folder_);
+    setenv("KSP_TEST_MACHINE", folder_.c_str(), 1);
+  }
+  ~Brellium() override { fs::remove_all(folder_); }
 
-  const std::string& name() const { return name_; }
+  std::string path(const std::string& name) const { return folder_ / name; }
 
- private:
-  const std::string name_ = testing::TempDir() + "host" + std::to_string(getpid()) + ".toml";
+  void write(const std::string& name, const std::string& text) const {
+    fs::create_directories((folder_ / name).parent_path());
+    std::ofstream(folder_ / name) << text << '\n';
+  }
+
+  std::string read(const std::string& name) const {
+    std::stringstream text;
+    text << std::ifstream(folder_ / name).rdbuf();
+    return text.str();
+  }
+
+  /// A host file, from behind the activity's identifier on.
+  std::string host(const std::string& text) const {
+    write("host.toml", "[activity]\nidentifier = \"com.vantor.brellium\"\n" + text);
+    return path("host.toml");
+  }
+
+  const fs::path folder_;
 };
 
 std::string example(const std::string& name) {
   return std::string(KSP_EXAMPLE_HOSTS) + "/" + name + ".toml";
 }
 
-const Lines kFlashOpened = {"start brellium", "running brellium",
-                            "Fendrel: findNandExporter: Controller found: VantorFlash3NVMeController",
-                            "opened io service connection"};
+const std::string kEndless = "[[controller]]\nclass = \"KSPStorage\"\nsteps = [1]\n";
 
-TEST(Brellium, WorksPendingStepsOffAndEnds) {
-  Lines expected = kFlashOpened;
-  for (const char* text : {"iter# 1 - BEGIN", "iter# 1 - KSP status pass - is BDR done: NO (1)"})
-    expected.push_back(text);
-  for (char check = '1'; check <= '6'; ++check) {
-    expected.push_back(std::string("  - defer chck ") + check + "/6 - sleeping for 5s");
-  }
-  for (const char* text : {"iter# 1 - DONE sleeping - more BDR", "iter# 2 - BEGIN",
-                           "iter# 2 - KSP status pass - is BDR done: YES (0)", "iter# 2 - DONE - no more BDR",
-                           "closing io service connection", "stopping brellium daemon"}) {
-    expected.push_back(text);
-  }
-  for (int run = 0; run < 2; ++run) {
-    Daemon daemon(example("default"));
-    EXPECT_EQ(daemon.lines(), expected);
-    EXPECT_EQ(daemon.exitStatus(), 0);
-  }
+Lines operator+(Lines lines, const Lines& more) {
+  lines.insert(lines.end(), more.begin(), more.end());
+  return lines;
 }
 
-TEST(Brellium, HostsWithoutWorkEndAtOnce) {
-  const struct {
-    const char* host;
+Lines opened(const std::string& controller) {
+  return {"running brellium", "Fendrel: findNandExporter: Controller found: " + controller,
+          "opened io service connection"};
+}
+
+Lines step(int number, const std::string& outcome) {
+  const std::string name = "iter# " + std::to_string(number);
+  return {name + " - BEGIN", name + " - KSP status " + outcome};
+}
+
+Lines slept(int checks) {
+  Lines lines;
+  for (int i = 1; i <= checks; ++i)
+    lines.push_back("  - defer chck " + std::to_string(i) + "/6 - sleeping for 5s");
+  return lines;
+}
+
+Lines ended(int number) {
+  return {"iter# " + std::to_string(number) + " - DONE - no more BDR", "closing io service connection",
+          "stopping brellium daemon"};
+}
+
+Lines deferred(int number, int check) {
+  return {"  - defer chck " + std::to_string(check) + "/6 - deferring!!!!",
+          "iter# " + std::to_string(number) + " - DONE for now - more BDR", "closing io service connection",
+          "deferring brellium daemon"};
+}
+
+size_t count(const Lines& lines, const std::string& start) {
+  return static_cast<size_t>(std::count_if(lines.begin(), lines.end(),
+                                           [&](const std::string& line) { return line.starts_with(start); }));
+}
+
+TEST_F(Brellium, RunsEachExampleHost) {
+  const Lines start = {"start brellium"};
+  const Lines goesOn = {"iter# 1 - DONE sleeping - more BDR"};
+  struct Run {
     Lines lines;
-  } cases[] = {
-      {"no-controller", {"start brellium", "running brellium", "stopping brellium daemon"}},
-      {"refusing-first", {kFlashOpened[0], kFlashOpened[1], kFlashOpened[2], "stopping brellium daemon"}},
+    /// The host's line at which the run is stopped; none where it ends by itself.
+    std::string stopAt;
   };
-  for (const auto& [host, lines] : cases) {
-    Daemon daemon(example(host));
-    EXPECT_EQ(daemon.lines(), lines);
-    EXPECT_EQ(daemon.exitStatus(), 0);
+  const std::map<std::string, Run> runs = {
+      {"default",
+       {start + opened("VantorFlash3NVMeController") + step(1, "pass - is BDR done: NO (1)") + slept(6) +
+            goesOn + step(2, "pass - is BDR done: YES (0)") + ended(2),
+        ""}},
+      {"failing-step",
+       {start + opened("VantorEmbeddedNVMeController") + step(1, "pass - is BDR done: NO (4)") + slept(6) +
+            goesOn + step(2, "fail - is BDR done: NO (3)") + ended(2),
+        ""}},
+      {"no-controller", {start + Lines{"running brellium", "stopping brellium daemon"}, ""}},
+      {"periodic",
+       {start + opened("KSPStorage") + step(1, "pass - is BDR done: NO (2)") + slept(6) + goesOn +
+            step(2, "pass - is BDR done: NO (1)") + slept(6) + Lines{"iter# 2 - DONE sleeping - more BDR"} +
+            step(3, "pass - is BDR done: YES (0)") + ended(3),
+        "host: next run in 3600 s"}},
+      {"refusing-first",
+       {start + Lines{"running brellium",
+                      "Fendrel: findNandExporter: Controller found: VantorFlash3NVMeController",
+                      "stopping brellium daemon"},
+        ""}},
+      {"yield-at-fourth-check",
+       {start + opened("VantorFlash3NVMeController") + step(1, "pass - is BDR done: NO (2)") + slept(3) +
+            deferred(1, 4),
+        "host: next run in 30 s"}},
+  };
+  size_t examples = 0;
+  for (const auto& file : fs::directory_iterator(KSP_EXAMPLE_HOSTS)) {
+    const auto found = runs.find(file.path().stem());
+    ASSERT_NE(found, runs.end()) << file.path() << " is not run";
+    const auto& [lines, stopAt] = found->second;
+    Daemon daemon(file.path());
+    EXPECT_EQ(daemon.lines(stopAt.empty() ? "no such line" : stopAt), lines) << file.path();
+    if (!stopAt.empty()) {
+      daemon.signal(SIGTERM);
+      EXPECT_EQ(daemon.allLines(), Lines{"host: SIGTERM: ending the process"});
+    }
+    EXPECT_EQ(daemon.exitStatus(), 0) << file.path();
+    ++examples;
   }
+  EXPECT_EQ(examples, runs.size());
 }
 
-TEST(Brellium, AStopYieldsClosesAndEndsClean) {
-  const HostFile endless(
-      "identifier = \"com.vantor.brellium\"\n[[controller]]\nclass = \"KSPStorage\"\nsteps = [1]\n");
+TEST_F(Brellium, TellsWhatTheHostHas) {
+  const std::string file = host(
+      "[yield]\non_battery = true\nio_pressure_percent = 5\n"
+      "[[controller]]\nclass = \"KSPStorage\"\n[[controller]]\nclass = \"VantorFlash3NVMeController\"\n");
+  EXPECT_EQ(Daemon(file).allLines("running"),
+            (Lines{"start brellium", "host: host file " + file, "host: emulating KSPStorage",
+                   "host: emulating VantorFlash3NVMeController",
+                   "host: on_battery never holds: /sys/class/power_supply tells nothing here",
+                   "host: io_pressure_percent never holds: /proc/pressure/io tells nothing here",
+                   "host: running activity com.vantor.brellium", "running brellium"}));
+}
+
+TEST_F(Brellium, AStopYieldsClosesAndEndsClean) {
+  const std::string file = host(kEndless);
   for (const int signal : {SIGTERM, SIGINT, SIGHUP}) {
-    Daemon daemon(endless.name());
+    Daemon daemon(file);
     daemon.lines("  - defer chck 1/6 - sleeping");
     daemon.signal(signal);
     const Lines rest = daemon.lines();
@@ -139,27 +282,259 @@ TEST(Brellium, AStopYieldsClosesAndEndsClean) {
   }
 }
 
-TEST(Brellium, ADeferredRunIsTriedAgainUntilAStopWhileIdle) {
-  Daemon daemon(example("yield-at-fourth-check"));
-  EXPECT_EQ(daemon.lines("deferring brellium").back(), "deferring brellium daemon");
-  EXPECT_EQ(daemon.line(), "host: next run in 30 s");
+TEST_F(Brellium, AStopSignalThatIsIgnoredStaysSo) {
+  Daemon daemon(host(kEndless), [] { ::signal(SIGHUP, SIG_IGN); });
+  daemon.lines("  - defer chck 1/6 - sleeping");
+  daemon.signal(SIGHUP);
+  EXPECT_EQ(count(daemon.lines("iter# 3 - BEGIN"), "iter# 2 - DONE sleeping"), 1u);
   daemon.signal(SIGTERM);
-  EXPECT_EQ(daemon.lines(), Lines{});
+  EXPECT_EQ(count(daemon.allLines(), "host: asking to yield: the process is being stopped"), 1u);
   EXPECT_EQ(daemon.exitStatus(), 0);
 }
 
-TEST(Brellium, AWrongHostFileStartsNothing) {
+TEST_F(Brellium, AStalledLogDelaysNoStop) {
+  Daemon daemon(host("start_after_s = 100000\n"));
+  EXPECT_EQ(daemon.allLines("host: next run").back(), "host: next run in 100000 s");
+  daemon.type('S' - '@');
+  std::this_thread::sleep_for(milliseconds(50));
+  const auto before = Clock::now();
+  daemon.signal(SIGTERM);
+  EXPECT_EQ(daemon.exitStatus(), 0);
+  EXPECT_LT(Clock::now() - before, milliseconds(5000));
+}
+
+TEST_F(Brellium, ItsTimesAreTheHostFiles) {
+  Daemon daemon(
+      host("start_after_s = 30\nretry_s = 20\ninterval_s = 40\n[yield]\nat_check = 2\n"
+           "[[controller]]\nclass = \"KSPStorage\"\nsteps = [1, 0]\n"));
+  // The steps start over: every other run is deferred, and behind each the next one begins in its time.
+  for (const int pause : {30, 20, 40, 20, 40}) {
+    const Lines before = daemon.allLines("host: next run in ");
+    EXPECT_EQ(before.back(), "host: next run in " + std::to_string(pause) + " s");
+    const auto idle = Clock::now();
+    EXPECT_EQ(daemon.line(), "host: running activity com.vantor.brellium");
+    EXPECT_GT(Clock::now() - idle, quickened(pause) * 8 / 10);
+    EXPECT_LT(Clock::now() - idle, quickened(pause) * 8 / 10 + milliseconds(2000));
+  }
+}
+
+TEST_F(Brellium, ARunYieldsOnceItHasLasted) {
+  Daemon daemon(host("[yield]\nafter_s = 8\n" + kEndless));
+  const Lines lines = daemon.allLines("deferring");
+  EXPECT_EQ(count(lines, "host: asking to yield: the run has lasted 8 s"), 1u);
+  EXPECT_EQ(lines.back(), "deferring brellium daemon");
+  EXPECT_LE(count(lines, "  - defer chck "), 3u) << "asked at 10 s at the latest";
+  EXPECT_GE(count(lines, "  - defer chck "), 2u);
+}
+
+// The machine's pressure comes through a pipe, a figure a question: there is none behind the one that asks to
+// yield.
+class Pressure : public Brellium {
+ protected:
+  Pressure() : pipe_(path("proc/pressure/io")) {
+    fs::create_directories(path("proc/pressure"));
+    EXPECT_EQ(mkfifo(pipe_.c_str(), 0600), 0);
+  }
+
+  /// Answers the next question.
+  void answer(const std::string& percent) const {
+    const auto end = Clock::now() + kPatience;
+    int pipe = -1;
+    while ((pipe = open(pipe_.c_str(), O_WRONLY | O_NONBLOCK)) < 0 && Clock::now() < end) {
+      std::this_thread::sleep_for(milliseconds(1));
+    }
+    ASSERT_GE(pipe, 0) << "nobody asks for the pressure";
+    // The next question is to find a pipe of its own, not the rest of this one.
+    const std::string next = pipe_ + ".next";
+    ASSERT_EQ(mkfifo(next.c_str(), 0600), 0);
+    fs::rename(next, pipe_);
+    const std::string text = "some avg10=" + percent + " avg60=0.00 avg300=0.00 total=0\n";
+    EXPECT_EQ(::write(pipe, text.data(), text.size()), static_cast<ssize_t>(text.size()));
+    close(pipe);
+  }
+
+  const std::string pipe_;
+};
+
+TEST_F(Pressure, ARunThatWasAskedToYieldIsDeferredThoughItHasPassed) {
+  Daemon daemon(host("[yield]\nio_pressure_percent = 40\n" + kEndless));
+  for (const char* percent : {"0.00", "40.00", "12.00", "40.01"}) answer(percent);
+  EXPECT_EQ(daemon.lines("deferring"), Lines{"start brellium"} + opened("KSPStorage") +
+                                           step(1, "pass - is BDR done: NO (1)") + slept(1) + deferred(1, 2));
+  EXPECT_EQ(daemon.line(), "host: next run in 60 s");
+}
+
+TEST_F(Pressure, AConditionThatHangsDelaysNoStop) {
+  Daemon daemon(host("[yield]\nio_pressure_percent = 40\n" + kEndless));
+  answer("0.00");
+  std::this_thread::sleep_for(milliseconds(50));
+  daemon.signal(SIGTERM);
+  const Lines lines = daemon.allLines();
+  EXPECT_EQ(lines.back(), "host: SIGTERM: ending the process");
+  EXPECT_EQ(count(lines, "host: running"), 0u);
+  EXPECT_EQ(daemon.exitStatus(), 0);
+}
+
+TEST_F(Brellium, NoRunBeginsOnBattery) {
+  write("sys/class/power_supply/BAT0/type", "Battery");
+  write("sys/class/power_supply/BAT0/status", "Discharging");
+  write("sys/class/power_supply/AC/online", "0");
+  Daemon daemon(
+      host("retry_s = 10\n[yield]\non_battery = true\n[metrics]\nfile = \"" + path("metrics") + "\"\n"));
+  daemon.allLines("host: no run begins: on battery; asking again every 10 s");
+  std::this_thread::sleep_for(quickened(50));
+  EXPECT_NE(read("metrics").find("brellium_deferrals_total{reason=\"battery\"} 1\n"), std::string::npos);
+  write("sys/class/power_supply/AC/online", "1");
+  EXPECT_EQ(daemon.allLines(),
+            (Lines{"host: running activity com.vantor.brellium", "running brellium",
+                   "stopping brellium daemon", "host: the activity has finished, ending the process"}))
+      << "why no run began is said once";
+  EXPECT_EQ(daemon.exitStatus(), 0);
+}
+
+TEST_F(Brellium, DriversFailAsTheHostFileSays) {
+  Daemon closing(
+      host("interval_s = 1\n[[controller]]\nclass = \"KSPStorage\"\nclose_result = 5\n"
+           "gone_after_lookups = 1\n"));
+  const Lines first = closing.lines("stopping");
+  EXPECT_EQ(Lines(first.end() - 3, first.end()),
+            (Lines{"closing io service connection", "error closing connection to service",
+                   "stopping brellium daemon"}));
+  EXPECT_EQ(closing.lines("stopping"), (Lines{"running brellium", "stopping brellium daemon"}))
+      << "it is gone";
+}
+
+TEST_F(Brellium, AWrongHostFileStartsNothing) {
   Daemon missing("no/such.toml");
   EXPECT_EQ(missing.lines(), Lines{"brellium: no/such.toml: cannot be read: No such file or directory"});
   EXPECT_EQ(missing.exitStatus(), 78);
 
-  const HostFile other("identifier = \"another\"\n");
-  Daemon unknown(other.name());
+  write("other.toml", "[activity]\nidentifier = \"another\"");
+  Daemon unknown(path("other.toml"));
   EXPECT_EQ(unknown.lines(),
-            (Lines{"start brellium", "brellium: " + other.name() +
+            (Lines{"start brellium", "brellium: " + path("other.toml") +
                                          ":2: the host declares activity 'another', but none "
                                          "named 'com.vantor.brellium'"}));
   EXPECT_EQ(unknown.exitStatus(), 78);
+
+  Daemon unread("no/such.toml", [] {
+    int ends[2];
+    if (pipe(ends) != 0 || dup2(ends[1], STDERR_FILENO) < 0) _exit(126);
+    close(ends[0]);
+  });
+  EXPECT_EQ(unread.exitStatus(), 78) << "with nobody to read the line";
+}
+
+#ifndef KSP_SANITIZED
+TEST_F(Brellium, WhatTheSystemRefusesEndsWithALineAndItsStatus) {
+  Daemon threadless(host(kEndless), [] {
+    const rlimit boundless = {.rlim_cur = rlim_t{1} << 50, .rlim_max = RLIM_INFINITY};
+    if (setrlimit(RLIMIT_STACK, &boundless) != 0) _exit(126);
+  });
+  EXPECT_EQ(threadless.allLines().back(),
+            "brellium: the system refuses a thread: Resource temporarily unavailable");
+  EXPECT_EQ(threadless.exitStatus(), 71);
+
+  // Whichever piece of the start memory runs out for: the loader's own failure is 127.
+  int refused = 0;
+  for (rlim_t kibibytes = 200; kibibytes <= 1200; kibibytes += 25) {
+    Daemon daemon(host(kEndless), [&] {
+      const rlimit limit = {.rlim_cur = kibibytes << 10, .rlim_max = kibibytes << 10};
+      if (setrlimit(RLIMIT_DATA, &limit) != 0) _exit(126);
+    });
+    const int status = daemon.exitStatus();
+    EXPECT_TRUE(status == 71 || status == 127) << status << " with " << kibibytes << " KiB";
+    refused += status == 71 ? 1 : 0;
+  }
+  EXPECT_GT(refused, 0);
+}
+#endif
+
+/// What promtool has to say about a file of metrics.
+std::string complaintsAbout(const std::string& metrics) {
+  const std::string said = metrics + ".checked";
+  const pid_t process = fork();
+  if (process == 0) {
+    dup2(open(metrics.c_str(), O_RDONLY), STDIN_FILENO);
+    dup2(dup2(open(said.c_str(), O_WRONLY | O_CREAT, 0600), STDOUT_FILENO), STDERR_FILENO);
+    execlp("promtool", "promtool", "check", "metrics", nullptr);
+    _exit(127);
+  }
+  int status = 0;
+  waitpid(process, &status, 0);
+  std::stringstream text;
+  text << std::ifstream(said).rdbuf();
+  return status == 0 ? text.str() : text.str() + "it failed";
+}
+
+TEST_F(Brellium, KeepsItsMetrics) {
+  const std::string told = "[metrics]\nfile = \"" + path("brellium.prom") + "\"\n";
+  Daemon daemon(host("interval_s = 1\n" + told +
+                     "[yield]\nat_check = 8\n[[controller]]\nclass = \"KSPStorage\"\n"
+                     "steps = [1, 1, {reply = 1, result = 7}]\n"));
+  daemon.allLines("  - defer chck 1/6");
+  EXPECT_NE(read("brellium.prom").find("brellium_steps_total{result=\"pass\"} 1\n"), std::string::npos)
+      << "written after the step";
+  daemon.allLines("host: next run in 60 s");
+  const std::string afterFirst = read("brellium.prom");
+  for (const char* sample : {"brellium_runs_total 1\n", "brellium_steps_total{result=\"pass\"} 2\n",
+                             "brellium_deferrals_total{reason=\"check\"} 1\n", "brellium_work_pending 1\n"}) {
+    EXPECT_NE(afterFirst.find(sample), std::string::npos) << sample << afterFirst;
+  }
+  EXPECT_EQ(afterFirst.find("timestamp"), std::string::npos) << "no run has finished";
+  const double lasted = std::stod(afterFirst.substr(afterFirst.find("\nbrellium_run_seconds_total ") + 28));
+  EXPECT_GE(lasted, 35);
+  EXPECT_LT(lasted, 350);
+  daemon.allLines("host: next run in 1 s");
+  const std::string afterSecond = read("brellium.prom");
+  for (const char* sample : {"brellium_runs_total 2\n", "brellium_steps_total{result=\"fail\"} 1\n"}) {
+    EXPECT_NE(afterSecond.find(sample), std::string::npos) << sample << afterSecond;
+  }
+  const long finish = std::stol(afterSecond.substr(afterSecond.rfind(' ')));
+  EXPECT_NEAR(static_cast<double>(finish), static_cast<double>(time(nullptr)), 20);
+  daemon.signal(SIGTERM);
+  EXPECT_EQ(complaintsAbout(path("brellium.prom")), "");
+}
+
+TEST_F(Brellium, MetricsThatCannotBeWrittenAreSaidOnce) {
+  Daemon daemon(host("[metrics]\nfile = \"" + path("no/brellium.prom") +
+                     "\"\n[[controller]]\nclass = \"KSPStorage\"\nsteps = [1, 0]\n"));
+  const Lines lines = daemon.allLines();
+  EXPECT_EQ(count(lines, "host: no metrics: " + path("no/brellium.prom") + ": No such file or directory"),
+            1u);
+  EXPECT_EQ(count(lines, "stopping brellium daemon"), 1u);
+  EXPECT_EQ(daemon.exitStatus(), 0);
+}
+
+TEST_F(Brellium, TellsTheServiceManagerWhatGoesOn) {
+  const int manager = socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+  sockaddr_un address = {.sun_family = AF_UNIX, .sun_path = {}};
+  path("notify").copy(address.sun_path, sizeof address.sun_path - 1);
+  ASSERT_EQ(bind(manager, reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
+  const timeval patience = {.tv_sec = 10, .tv_usec = 0};
+  setsockopt(manager, SOL_SOCKET, SO_RCVTIMEO, &patience, sizeof patience);
+  const auto told = [&] {
+    char text[256];
+    const ssize_t size = recv(manager, text, sizeof text, 0);
+    return std::string(text, static_cast<size_t>(std::max<ssize_t>(size, 0)));
+  };
+  write("sys/class/power_supply/BAT0/type", "Battery");
+  write("sys/class/power_supply/BAT0/status", "Discharging");
+  Daemon daemon(host("start_after_s = 20\n[yield]\non_battery = true\nat_check = 7\n" + kEndless),
+                [&] { setenv("NOTIFY_SOCKET", path("notify").c_str(), 1); });
+  EXPECT_EQ(told(), "READY=1");
+  EXPECT_TRUE(told().starts_with("STATUS=idle until 20"));
+  EXPECT_TRUE(told().starts_with("STATUS=idle, on battery; asking again at 20"));
+  write("sys/class/power_supply/BAT0/status", "Full");
+  for (const char* text : {"STATUS=running", "STATUS=running, step 1", "STATUS=running, step 2",
+                           "STATUS=asked to yield: check 7"}) {
+    EXPECT_EQ(told(), text);
+  }
+  EXPECT_TRUE(told().starts_with("STATUS=idle until 20"));
+  daemon.signal(SIGTERM);
+  EXPECT_EQ(told(), "STOPPING=1\nSTATUS=stopping");
+  EXPECT_EQ(daemon.exitStatus(), 0);
+  close(manager);
 }
 
 TEST(HostDriver, AClientReachesTheControllerThatAccepts) {
@@ -167,24 +542,43 @@ TEST(HostDriver, AClientReachesTheControllerThatAccepts) {
   ExporterEntry* entry = nullptr;
   ASSERT_EQ(findNandExporterNew(&entry), 1);
   EXPECT_STREQ(entry->className, "VantorEmbeddedNVMeController");
-  unsigned char request[24] = {39, 0, 0, 0, 1, 4};
-  unsigned char reply[4] = {};
-  size_t size = sizeof reply;
-  EXPECT_EQ(CallStructMethod(entry->connection, entry->tunnelMethod, request, sizeof request, reply, &size),
-            0);
-  EXPECT_EQ(size, 4u);
-  EXPECT_NE(
-      CallStructMethod(entry->connection, entry->tunnelMethod + 1, request, sizeof request, reply, &size), 0);
-  EXPECT_NE(CallStructMethod(entry->connection, entry->tunnelMethod, request, 23, reply, &size), 0);
-  uint32_t untouched = 7;
-  EXPECT_NE(OpenServiceConnection(entry->service, getpid() + 1, 0, &untouched), 0);
-  EXPECT_NE(OpenServiceConnection(entry->service + 1000, getpid(), 0, &untouched), 0);
-  EXPECT_EQ(untouched, 7u);
+  unsigned char reply[4] = {7, 7, 7, 7};
+  const auto call = [&](uint32_t connection, uint32_t method, unsigned char selector, unsigned char parameter,
+                        size_t inputSize, size_t& room) {
+    const unsigned char request[24] = {selector, 0, 0, 0, parameter, 4};
+    return CallStructMethod(connection, method, request, inputSize, reply, &room);
+  };
   const uint32_t connection = entry->connection;
   const uint32_t service = entry->service;
+  const uint32_t method = entry->tunnelMethod;
+  for (int refusal = 0; refusal < 6; ++refusal) {
+    size_t room = refusal == 0 ? 3 : 4;
+    EXPECT_NE(call(connection + (refusal == 1 ? 1000 : 0), method + (refusal == 2 ? 1 : 0),
+                   refusal == 3 ? 38 : 39, refusal == 4 ? 2 : 1, refusal == 5 ? 23 : 24, room),
+              0)
+        << refusal;
+    EXPECT_EQ(room, 0u) << refusal;
+    EXPECT_EQ(reply[0], 7) << refusal;
+  }
+  size_t room = 100;
+  EXPECT_NE(CallStructMethod(connection, method, nullptr, 24, reply, &room), 0);
+  EXPECT_EQ(room, 0u);
+  room = 4;
+  EXPECT_EQ(call(connection, method, 39, 1, 24, room), 0);
+  EXPECT_EQ(room, 4u);
+  EXPECT_EQ(reply[0], 0);
+  uint32_t untouched = 7;
+  EXPECT_NE(OpenServiceConnection(service, getpid() + 1, 0, &untouched), 0);
+  EXPECT_NE(OpenServiceConnection(service, getpid(), 1, &untouched), 0);
+  EXPECT_NE(OpenServiceConnection(service, getpid(), 0, nullptr), 0);
+  EXPECT_NE(OpenServiceConnection(service + 1000, getpid(), 0, &untouched), 0);
+  EXPECT_EQ(untouched, 7u);
   ReleaseIOInterfaces(entry);
   EXPECT_NE(CloseServiceConnection(connection), 0) << "closed already";
   EXPECT_NE(ReleaseServiceObject(service), 0) << "released already";
+  EXPECT_EQ(GetMatchingService(DefaultRegistry + 1, ServiceMatchByClass("VantorFlash3NVMeController")), 0u);
+  EXPECT_EQ(GetMatchingService(DefaultRegistry, nullptr), 0u);
+  EXPECT_EQ(ServiceMatchByClass(nullptr), nullptr);
 }
 
 }  // namespace

@@ -7,7 +7,6 @@
 #include <filesystem>
 #include <fstream>
 
-#include "platform/host/conditions.h"
 #include "platform/host/host_file.h"
 #include "platform/host/screen.h"
 
@@ -46,6 +45,7 @@ TEST(HostFile, EveryExampleIsAccepted) {
 TEST(HostFile, KeysReachTheirSettings) {
   const host::HostFile file = host::parseHostFile(
       "activity = { identifier = \"x\", start_after_s = 1, retry_s = 2, interval_s = 3 }\n"
+      "metrics.file = '/run/x'\n"
       "yield = { on_battery = true, io_pressure_percent = 4, after_s = 5, at_check = 6 }\n"
       "[[controller]]\nclass = \"KSPStorage\"\nsteps = [7, { reply = 8, result = 0xFFFFFFFF }]\n"
       "open_result = 9\nclose_result = 10\ngone_after_lookups = 11\n",
@@ -54,6 +54,7 @@ TEST(HostFile, KeysReachTheirSettings) {
   EXPECT_EQ(file.activity.startAfterSeconds, 1u);
   EXPECT_EQ(file.activity.retrySeconds, 2u);
   EXPECT_EQ(file.activity.intervalSeconds, 3u);
+  EXPECT_EQ(file.metricsFile, "/run/x");
   EXPECT_TRUE(file.yield.onBattery);
   EXPECT_EQ(file.yield.ioPressurePercent, 4u);
   EXPECT_EQ(file.yield.afterSeconds, 5u);
@@ -174,30 +175,6 @@ TEST(HostFile, WhatTheParserCannotTakeIsRefusedBeforeItSeesIt) {
     const auto objection = host::objectionTo(text);
     EXPECT_EQ(objection ? std::optional(objection->line) : std::nullopt, line) << text.substr(0, 80);
   }
-}
-
-TEST_F(Folder, BatteryCountsWhileItDischargesAndNothingElseSupplies) {
-  EXPECT_FALSE(host::runsOnBattery(folder_));
-  write("BAT0/type", "Battery");
-  write("BAT0/status", "Discharging");
-  EXPECT_TRUE(host::runsOnBattery(folder_));
-  write("AC/type", "Mains");
-  write("AC/online", "0");
-  EXPECT_TRUE(host::runsOnBattery(folder_));
-  write("AC/online", "1");
-  EXPECT_FALSE(host::runsOnBattery(folder_));
-  write("AC/online", "0");
-  write("BAT0/scope", "Device");
-  EXPECT_FALSE(host::runsOnBattery(folder_)) << "a mouse's battery";
-}
-
-TEST_F(Folder, PressureIsTheTenSecondAverageOfSomeTask) {
-  EXPECT_EQ(host::ioPressurePercent(folder_ / "io"), std::nullopt);
-  write("io",
-        "some avg10=12.50 avg60=3.00 avg300=1.00 total=9\nfull avg10=99.00 avg60=0.00 avg300=0.00 total=1");
-  EXPECT_EQ(host::ioPressurePercent(folder_ / "io"), 12.5);
-  write("io", "some avg10=wrong");
-  EXPECT_EQ(host::ioPressurePercent(folder_ / "io"), std::nullopt);
 }
 
 }  // namespace

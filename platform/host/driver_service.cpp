@@ -3,15 +3,19 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <cstring>
 #include <map>
 #include <memory>
 #include <mutex>
 #include <new>
+#include <optional>
+#include <span>
 #include <string>
+#include <utility>
 #include <vector>
 
+#include "platform/host/activity.h"
 #include "platform/host/host_file.h"
+#include "platform/host/log.h"
 
 const char PropertyMatchKey[] = "PropertyMatch";
 
@@ -26,13 +30,13 @@ constexpr size_t kRequestSize = 24;
 constexpr uint32_t kTaskSchedulerSelector = 39;
 constexpr uint32_t kStepParameter = 0x401;
 
-uint32_t loadLittleEndian(const unsigned char* bytes) {
+uint32_t loadLittleEndian(std::span<const unsigned char> bytes) {
   uint32_t value = 0;
   for (unsigned i = 0; i < 4; ++i) value |= uint32_t{bytes[i]} << (8 * i);
   return value;
 }
 
-void storeLittleEndian(uint32_t value, unsigned char* bytes) {
+void storeLittleEndian(uint32_t value, std::span<unsigned char> bytes) {
   for (unsigned i = 0; i < 4; ++i) bytes[i] = static_cast<unsigned char>(value >> (8 * i));
 }
 
@@ -49,15 +53,16 @@ class EmulatedController {
   int32_t openResult() const { return settings_.openResult; }
   int32_t closeResult() const { return settings_.closeResult; }
 
-  int32_t call(uint32_t method, const void* input, size_t inputSize, void* output, size_t* outputSize) {
-    const auto* request = static_cast<const unsigned char*>(input);
+  /// Sets `outputSize` where it answers.
+  int32_t call(uint32_t method, std::span<const unsigned char> input, std::span<unsigned char> output,
+               size_t& outputSize) {
     if (method != settings_.tunnelMethod) return -ENOSYS;
-    if (inputSize != kRequestSize || *outputSize < sizeof(uint32_t)) return -EINVAL;
-    if (loadLittleEndian(request) != kTaskSchedulerSelector) return -ENOTSUP;
-    if (loadLittleEndian(request + 4) != kStepParameter) return -EINVAL;
+    if (input.size() != kRequestSize || output.size() < sizeof(uint32_t)) return -EINVAL;
+    if (loadLittleEndian(input) != kTaskSchedulerSelector) return -ENOTSUP;
+    if (loadLittleEndian(input.subspan(4)) != kStepParameter) return -EINVAL;
     const host::Step step = nextStep();
-    storeLittleEndian(step.reply, static_cast<unsigned char*>(output));
-    *outputSize = sizeof(uint32_t);
+    storeLittleEndian(step.reply, output);
+    outputSize = sizeof(uint32_t);
     return step.result;
   }
 
@@ -95,11 +100,11 @@ class Registry {
     return result;
   }
 
-  template <class... Arguments>
-  int32_t call(uint32_t connection, Arguments... arguments) {
+  int32_t call(uint32_t connection, uint32_t method, std::span<const unsigned char> input,
+               std::span<unsigned char> output, size_t& outputSize) {
     const std::lock_guard lock(mutex_);
     const auto found = connections_.find(connection);
-    return found == connections_.end() ? -EBADF : found->second->call(arguments...);
+    return found == connections_.end() ? -EBADF : found->second->call(method, input, output, outputSize);
   }
 
   int32_t close(uint32_t connection) {
@@ -139,7 +144,7 @@ Registry& registry() {
     try {
       return new Registry(host::hostFile().controllers);
     } catch (const host::HostFileError& fault) {
-      host::report(fault);
+      host::report(fault.what());
       return new Registry(kNone);
     }
   }();
@@ -177,14 +182,25 @@ int32_t OpenServiceConnection(uint32_t service, int32_t process, uint32_t type, 
 
 int32_t CallStructMethod(uint32_t connection, uint32_t method, const void* input, size_t inputSize,
                          void* output, size_t* outputSize) {
-  if (input == nullptr || output == nullptr || outputSize == nullptr) return -EINVAL;
-  return registry().call(connection, method, input, inputSize, output, outputSize);
+  if (outputSize == nullptr) return -EINVAL;
+  // Nothing is written until a driver says so.
+  const size_t room = std::exchange(*outputSize, 0);
+  if (input == nullptr || output == nullptr) return -EINVAL;
+  auto* const reply = static_cast<unsigned char*>(output);
+  host::stepBegins();
+  const int32_t result = unlessOutOfMemory(int32_t{-ENOMEM}, [&] {
+    return registry().call(connection, method, {static_cast<const unsigned char*>(input), inputSize},
+                           {reply, room}, *outputSize);
+  });
+  host::stepEnded(result,
+                  *outputSize == 0 ? std::nullopt : std::optional(loadLittleEndian({reply, *outputSize})));
+  return result;
 }
 
 int32_t CloseServiceConnection(uint32_t connection) {
-  return registry().close(connection);
+  return unlessOutOfMemory(int32_t{-ENOMEM}, [&] { return registry().close(connection); });
 }
 
 int32_t ReleaseServiceObject(uint32_t service) {
-  return registry().release(service);
+  return unlessOutOfMemory(int32_t{-ENOMEM}, [&] { return registry().release(service); });
 }

@@ -7,7 +7,6 @@
 #include <toml++/toml.h>
 #include <algorithm>
 #include <cerrno>
-#include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <limits>
@@ -131,6 +130,18 @@ YieldSettings readYield(TableReader reader) {
   return settings;
 }
 
+std::string readMetrics(TableReader reader) {
+  const toml::node* node = reader.find("file");
+  if (node == nullptr) reader.fail("the metrics have no 'file'");
+  if (!node->is_string()) reader.failType(*node, "file", "a text");
+  auto path = *node->value_exact<std::string>();
+  if (!path.starts_with('/') || path.find('\0') != std::string::npos) {
+    reader.failType(*node, "file", "an absolute path");
+  }
+  reader.refuseUnknownKeys();
+  return path;
+}
+
 /// A step is its reply, or a table of reply and result.
 Step readStep(const TableReader& controller, std::string_view file, const toml::node& node) {
   constexpr uint32_t kGreatest = std::numeric_limits<uint32_t>::max();
@@ -191,6 +202,10 @@ HostFile readHostFile(std::string_view name, const toml::table& root) {
   if (const toml::node* node = reader.find("yield")) {
     if (!node->is_table()) reader.failType(*node, "yield", "a table");
     file.yield = readYield({name, "yield", *node->as_table()});
+  }
+  if (const toml::node* node = reader.find("metrics")) {
+    if (!node->is_table()) reader.failType(*node, "metrics", "a table");
+    file.metricsFile = readMetrics({name, "metrics", *node->as_table()});
   }
   if (const toml::node* node = reader.find("controller")) {
     if (!node->is_array()) reader.failType(*node, "controller", "a list of tables: [[controller]]");
@@ -295,10 +310,6 @@ const HostFile& hostFile() {
   static const HostFile& file = *new HostFile(
       findHostFile(secure_getenv("KSP_HOST_FILE"), secure_getenv("CREDENTIALS_DIRECTORY"), kSystemFile));
   return file;
-}
-
-void report(const HostFileError& fault) {
-  std::fprintf(stderr, "%s: %s\n", program_invocation_short_name, fault.what());
 }
 
 }  // namespace host

@@ -53,6 +53,8 @@ struct HostFile {
   std::string name;
   ActivitySettings activity;
   YieldSettings yield;
+  /// Where the activity's metrics are kept; empty for nowhere.
+  std::string metricsFile;
   std::vector<ControllerSettings> controllers;
 };
 
@@ -61,9 +63,6 @@ class HostFileError : public std::runtime_error {
  public:
   HostFileError(std::string_view file, unsigned line, std::string_view fault);
 };
-
-/// Exit status of a start that a wrong host file ended.
-inline constexpr int kExitConfiguration = 78;
 
 /// Reads and checks the host file text; `name` stands in messages. Throws HostFileError.
 HostFile parseHostFile(std::string_view text, std::string_view name);
@@ -80,8 +79,5 @@ HostFile findHostFile(const char* named, const char* credentials, const char* sy
 /// The host file of this process, looked for at the first call: $KSP_HOST_FILE, then $CREDENTIALS_DIRECTORY,
 /// then /etc/brellium/host.toml. Throws HostFileError.
 const HostFile& hostFile();
-
-/// Writes a fault to standard error, as the one line of a start that ends there.
-void report(const HostFileError& fault);
 
 }  // namespace host

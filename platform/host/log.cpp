@@ -10,7 +10,7 @@
 #include <cstdio>
 #include <cstring>
 
-#include "platform/host/bring_up.h"
+#include "platform/host/process.h"
 #include "platform/system_log.h"
 
 namespace host {
@@ -61,6 +61,10 @@ void note(const char* format, ...) {
   va_end(arguments);
   makePrintable({text, std::strlen(text)});
   syslog(LOG_NOTICE, "host: %s", text);
+}
+
+void report(const char* line) {
+  std::fprintf(stderr, "%s: %s\n", program_invocation_short_name, line);
 }
 
 }  // namespace host

@@ -14,4 +14,7 @@ void openLog();
 /// Writes a message of the host's own, in printf style, to where the process logs.
 void note(const char* format, ...) __attribute__((format(printf, 1, 2)));
 
+/// Writes to standard error the one line of a start that ends with it.
+void report(const char* line);
+
 }  // namespace host
