@@ -136,10 +136,9 @@ TEST_F(Folder, TheHostFileIsLookedForInThreePlaces) {
   writeHost("system");
   EXPECT_EQ(found("", credentials.c_str()), "system");
   fs::create_directories(credentials);
-  std::ofstream(credentials + "/ksp-host.toml").close();
-  EXPECT_EQ(found(nullptr, credentials.c_str()), "system") << "an empty credential stands for none";
-  writeHost("credentials/ksp-host.toml");
-  EXPECT_EQ(found(nullptr, credentials.c_str()), "credentials/ksp-host.toml");
+  EXPECT_EQ(found(nullptr, credentials.c_str()), "system");
+  writeHost("credentials/brellium_host.toml");
+  EXPECT_EQ(found(nullptr, credentials.c_str()), "credentials/brellium_host.toml");
   EXPECT_EQ(found(path("named").c_str(), credentials.c_str()),
             "named: cannot be read: No such file or directory");
   writeHost("named");

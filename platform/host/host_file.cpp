@@ -19,7 +19,8 @@ namespace host {
 namespace {
 
 constexpr char kSystemFile[] = "/etc/brellium/host.toml";
-constexpr char kCredential[] = "/ksp-host.toml";
+/// What the service manager calls its copy of the system's file.
+constexpr char kCredential[] = "/brellium_host.toml";
 constexpr size_t kGreatestFileSize = size_t{64} << 10;
 constexpr uint32_t kGreatestSeconds = 366 * 24 * 60 * 60;
 
@@ -297,9 +298,8 @@ HostFile findHostFile(const char* named, const char* credentials, const char* sy
   if (named != nullptr && *named != 0) return loadHostFile(named);
   struct stat status = {};
   if (credentials != nullptr) {
-    // An empty one stands for none: a service manager may have to put something there in any case.
     const std::string credential = std::string(credentials) + kCredential;
-    if (stat(credential.c_str(), &status) == 0 && status.st_size != 0) return loadHostFile(credential);
+    if (lstat(credential.c_str(), &status) == 0) return loadHostFile(credential);
   }
   if (lstat(systemFile, &status) == 0 || errno != ENOENT) return loadHostFile(systemFile);
   return {};

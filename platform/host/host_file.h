@@ -71,9 +71,9 @@ HostFile parseHostFile(std::string_view text, std::string_view name);
 /// be read.
 HostFile loadHostFile(const std::string& path);
 
-/// Looks for the host file: the one `named`, else the credential `ksp-host.toml` in the folder `credentials`
-/// unless it is empty, else `systemFile`, a link that leads nowhere included; returns the defaults where
-/// there is none. `named` and `credentials` may be null. Throws HostFileError.
+/// Looks for the host file: the one `named`, else `brellium_host.toml` in the folder `credentials`, else
+/// `systemFile`, a link that leads nowhere included; returns the defaults where there is none. `named` and
+/// `credentials` may be null. Throws HostFileError.
 HostFile findHostFile(const char* named, const char* credentials, const char* systemFile);
 
 /// The host file of this process, looked for at the first call: $KSP_HOST_FILE, then $CREDENTIALS_DIRECTORY,
