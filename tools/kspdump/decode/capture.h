@@ -8,6 +8,8 @@
 #include <string_view>
 #include <vector>
 
+#include "ksp/detail/little_endian.hpp"
+
 namespace kspdump {
 
 using Bytes = std::span<const unsigned char>;
@@ -32,10 +34,21 @@ class Values {
   [[nodiscard]] bool empty() const { return count_ == 0; }
 
   [[nodiscard]] uint64_t operator[](uint32_t i) const {
-    const unsigned char* const at = first_ + std::ptrdiff_t{stride_} * i;
-    uint64_t value = 0;
-    for (unsigned byte = width_; byte > 0; --byte) value = value << 8 | at[byte - 1];
-    return value;
+    return ksp::loadLittleEndian(first_ + std::ptrdiff_t{stride_} * i, size_t{width_});
+  }
+
+  /// Hands the values from `begin` to `end` to `take`, one after another.
+  template <class Take>
+  void forEach(uint32_t begin, uint32_t end, Take take) const {
+    constexpr size_t kWord = sizeof(uint64_t);
+    if (width_ == kWord && stride_ == kWord) {
+      const unsigned char* const last = first_ + kWord * end;
+      for (const unsigned char* at = first_ + kWord * begin; at != last; at += kWord) {
+        take(ksp::loadLittleEndian<uint64_t>(at));
+      }
+    } else {
+      for (uint32_t i = begin; i < end; ++i) take((*this)[i]);
+    }
   }
 
   [[nodiscard]] uint8_t width() const { return width_; }

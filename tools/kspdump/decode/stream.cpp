@@ -4,15 +4,14 @@ namespace kspdump {
 
 using std::to_string;
 
-void findSize(Capture& capture, const ksp::Record& record, const StreamWords& words) {
+void tellSize(Capture& capture, const ksp::Record& record, const StreamWords& words) {
   const ksp::RecordName name = record.name();
   const std::string title = std::string(name.view()) + "(" + to_string(record.key) + ") carries " +
                             counted(record.announced, words.unit);
   if (!record.isAsConfigured()) {
     capture.find(record.offset, title + ", " + to_string(record.configured) + " configured");
-  } else if (const uint64_t size = uint64_t{record.announced} * words.unitSize;
-             record.row == nullptr && size % record.elements.width() != 0) {
-    capture.find(record.offset, title + ", of which the last " + to_string(size % record.elements.width()) +
+  } else {
+    capture.find(record.offset, title + ", of which the last " + to_string(leftOver(record, words)) +
                                     " fill no element of " + to_string(record.elements.width()));
   }
 }

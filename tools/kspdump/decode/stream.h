@@ -72,8 +72,19 @@ Share walk(Stream& records, Bytes bytes, const StreamWords& words, Each each) {
   return share;
 }
 
+/// Bytes of a record without a row that fill no element.
+inline uint64_t leftOver(const ksp::Record& record, const StreamWords& words) {
+  if (record.row != nullptr) return 0;
+  return uint64_t{record.announced} * words.unitSize % record.elements.width();
+}
+
+/// Names what is wrong with a record's size.
+void tellSize(Capture& capture, const ksp::Record& record, const StreamWords& words);
+
 /// Names a record that has not the size that its key is configured with, and bytes that fill no element.
-void findSize(Capture& capture, const ksp::Record& record, const StreamWords& words);
+inline void findSize(Capture& capture, const ksp::Record& record, const StreamWords& words) {
+  if (!record.isAsConfigured() || leftOver(record, words) != 0) tellSize(capture, record, words);
+}
 
 /// Names what ended a walk before the capture's last byte, and bytes behind the end that may hide something.
 void findEnd(Capture& capture, const ksp::Ending& ending, const StreamWords& words);

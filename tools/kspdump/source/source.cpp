@@ -34,6 +34,13 @@ class Broken : public Stream {
   std::string why_;
 };
 
+/// Whether bytes are a capture. Most are one from their first bytes on, and then no more of them are looked
+/// at.
+bool isCapture(std::span<const unsigned char> bytes, const Reading& reading) {
+  constexpr size_t kFirst = 2048;
+  return (bytes.size() > kFirst && reading.isCapture(bytes.first(kFirst))) || reading.isCapture(bytes);
+}
+
 /// What a stream that begins so is, where it is no capture.
 Packing packingOfOther(std::span<const unsigned char> head, const Reading& reading) {
   const Packing packing = packingOf(head);
@@ -222,7 +229,7 @@ std::unique_ptr<Source> load(Input& input, const Reading& reading) {
     }
     if (within != nullptr) return within;
     if (input.state == State::kRead && input.isFound && !reading.keepsOthers &&
-        !reading.isCapture(input.bytes)) {
+        !isCapture(input.bytes, reading)) {
       input.state = State::kPassedOver;
     }
   } catch (const ReadFault& fault) {

@@ -1,5 +1,6 @@
 // JSON: a document a line and a capture, or one for a difference.
 
+#include <array>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -55,29 +56,14 @@ class Json : public View {
   void records(std::span<const Record> records) override {
     Appender appender(sink_);
     for (const Record& record : records) {
-      appender.text(hasRecords_ ? ",{\"key\":" : "{\"key\":");
+      appender.text(headOf(record).substr(hasRecords_ ? 0 : kRecordEnd.size() + 1));
       hasRecords_ = true;
-      appender.number(record.key);
-      appender.text(",\"name\":");
-      if (isPlainJson(record.name)) {
-        appender.text("\"");
-        appender.text(record.name);
-        appender.text("\"");
-      } else {
-        std::string name;
-        appendJson(name, record.name);
-        appender.text(name);
-      }
-      appender.text(",\"values\":[");
-      for (uint32_t i = 0; i < record.values.size(); ++i) {
-        if (i != 0) appender.text(",");
-        appender.number(record.values[i]);
-      }
-      appender.text("]}");
+      appender.list(record.values);
     }
   }
 
   void end(Capture& capture) override {
+    if (hasRecords_) sink_.text += kRecordEnd;
     sink_.text += "],";
     appendFindings(sink_.text, "findings", capture);
     sink_.text += "}\n";
@@ -117,7 +103,32 @@ class Json : public View {
   [[nodiscard]] bool showsFindings() const override { return true; }
 
  private:
+  static constexpr std::string_view kRecordEnd = "]}";
+
+  /// What stands between the values of a record and those of the one before, kept for the next capture's
+  /// records of the same name and key.
+  struct Head {
+    uint32_t key = 0;
+    std::string name;
+    std::string text;
+  };
+
+  std::string_view headOf(const Record& record) {
+    Head& head = heads_[record.key % heads_.size()];
+    if (head.text.empty() || head.key != record.key || head.name != record.name) {
+      head.key = record.key;
+      head.name = record.name;
+      head.text = std::string(kRecordEnd) + ",{\"key\":";
+      appendNumber(head.text, record.key);
+      head.text += ",\"name\":";
+      appendJson(head.text, record.name);
+      head.text += ",\"values\":[";
+    }
+    return head.text;
+  }
+
   bool hasRecords_ = false;
+  std::array<Head, 1024> heads_;
 };
 
 }  // namespace

@@ -8,6 +8,7 @@
 #include <string>
 #include <string_view>
 
+#include "ksp/detail/decimal.hpp"
 #include "tools/kspdump/view/view.h"
 
 namespace kspdump {
@@ -32,9 +33,27 @@ class Appender {
   }
 
   void number(uint64_t number) {
-    constexpr std::ptrdiff_t kMostDigits = 20;
-    if (std::end(buffer_) - at_ < kMostDigits) flush();
-    at_ = std::to_chars(at_, std::end(buffer_), number).ptr;
+    if (static_cast<size_t>(std::end(buffer_) - at_) < ksp::kDecimalRoom) flush();
+    at_ = ksp::writeDecimal(at_, number);
+  }
+
+  /// Appends numbers with commas between them.
+  void list(const Values& values) {
+    constexpr size_t kRoom = ksp::kDecimalRoom + 1;
+    const uint32_t count = values.size();
+    for (uint32_t done = 0; done < count;) {
+      if (static_cast<size_t>(std::end(buffer_) - at_) < kRoom) flush();
+      const size_t room = static_cast<size_t>(std::end(buffer_) - at_) / kRoom;
+      const auto end = static_cast<uint32_t>(std::min<size_t>(count, done + room));
+      char* at = at_;
+      values.forEach(done, end, [&](uint64_t value) {
+        at = ksp::writeDecimal(at, value);
+        *at++ = ',';
+      });
+      at_ = at;
+      done = end;
+    }
+    if (count != 0) --at_;
   }
 
  private:
