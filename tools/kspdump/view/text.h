@@ -13,10 +13,11 @@
 
 namespace kspdump {
 
-/// Appends small pieces to a view's text by way of a buffer.
+/// Appends small pieces to a view's text by way of a buffer. The text always has room for what is in it, so
+/// that the last of it fails for no want of memory.
 class Appender {
  public:
-  explicit Appender(Sink& sink) : sink_(sink) {}
+  explicit Appender(Sink& sink) : sink_(sink) { makeRoom(); }
   Appender(const Appender&) = delete;
   Appender& operator=(const Appender&) = delete;
   ~Appender() { sink_.text.append(buffer_, at_); }
@@ -61,7 +62,10 @@ class Appender {
     sink_.text.append(buffer_, at_);
     at_ = buffer_;
     sink_.offer();
+    makeRoom();
   }
+
+  void makeRoom() { sink_.text.reserve(sink_.text.size() + sizeof buffer_); }
 
   Sink& sink_;
   char buffer_[4096];
