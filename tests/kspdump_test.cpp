@@ -5,6 +5,7 @@
 #include <unistd.h>
 
 #include <cstdlib>
+#include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <nlohmann/json.hpp>
@@ -329,7 +330,7 @@ TEST_F(Kspdump, OutputIsWholeOrNotThere) {
   write("out", "before");
   EXPECT_EQ(run("stats --output out missing").status, 3);
   EXPECT_EQ(run("stats --output= out a.stats").err,
-            "kspdump: --output= has no value; kspdump --help tells more\n");
+            "kspdump: --output has an empty value: --output FILE; kspdump --help tells more\n");
   EXPECT_EQ(readAll(folder_ / "out"), "before");
   fs::create_symlink("out", folder_ / "link");
   EXPECT_EQ(run("stats --format csv --output link a.stats").status, 0);
@@ -346,20 +347,177 @@ TEST_F(Kspdump, OutputIsWholeOrNotThere) {
   EXPECT_EQ(broken.err, "");
 }
 
-TEST_F(Kspdump, WrongUsageEndsWithTwo) {
-  for (const char* arguments :
-       {"", "stats", "stats --format xml x", "snapshot a b", "stats --jobs 0 x", "nonsense"}) {
+TEST_F(Kspdump, OutputNeverDestroysACapture) {
+  write("a.stats", kStats);
+  write("b.stats", kStats);
+  write("h", "header");
+  fs::create_symlink("a.stats", folder_ / "link");
+  fs::create_hard_link(folder_ / "a.stats", folder_ / "hard");
+  for (const char* arguments : {"stats --output a.stats a.stats", "stats --force --output link a.stats",
+                                "diff stats --output hard b.stats a.stats",
+                                "snapshot --header h --output h x", "stats --output a.stats - < a.stats",
+                                "stats --output b.stats a.stats", "keys --output b.stats media"}) {
     const Outcome result = run(arguments);
     EXPECT_EQ(result.status, 2) << arguments;
-    EXPECT_NE(result.err, "") << arguments;
+    EXPECT_NE(result.err.find("--output"), std::string::npos) << arguments;
+    EXPECT_EQ(readAll(folder_ / "a.stats"), kStats) << arguments;
+    EXPECT_EQ(readAll(folder_ / "b.stats"), kStats) << arguments;
   }
+  EXPECT_EQ(run("stats --force --output b.stats --format csv a.stats").status, 0);
+  EXPECT_EQ(readAll(folder_ / "b.stats").substr(0, 7), "source,");
+  EXPECT_EQ(run("stats --output b.stats a.stats").status, 0) << "no capture any more";
+}
+
+TEST_F(Kspdump, WrongUsageNamesTheWordsThatAreWrong) {
+  const struct {
+    const char* arguments;
+    const char* said;
+  } cases[] = {
+      {"", "a command is missing; there are stats, summary, "},
+      {"nonsense", "there is no command nonsense; there are stats, "},
+      {"--format json stats f", "--format stands in front of the command: kspdump stats --format ..."},
+      {"--format", "--format stands where a command is missing; there are stats, "},
+      {"stats", "stats has no source: a file, or - for standard input"},
+      {"stats ''", "a source has an empty name"},
+      {"stats --format", "--format has no value: --format FORM, one of table json csv openmetrics"},
+      {"stats --format xml x", "--format knows no xml here, but table json csv openmetrics"},
+      {"stats --match= x", "--match has an empty value: --match GLOB"},
+      {"snapshot --header '' x", "--header has an empty value: --header FILE"},
+      {"stats --nonsense x", "there is no option --nonsense"},
+      {"stats -x", "there is no option -x"},
+      {"stats --numbers=1 x", "--numbers takes no value, so not --numbers=1"},
+      {"stats --jobs 0 x", "--jobs takes a number from 1 to 1024"},
+      {"stats --jobs 1025 x", "--jobs takes a number from 1 to 1024"},
+      {"stats --key 7-3 x", "--key takes N or N-M"},
+      {"stats --key 7- x", "--key takes N or N-M"},
+      {"stats --max-size 4G x", "--max-size takes a number of bytes below 4G"},
+      {"snapshot --jobs 2 f", "snapshot has no option --jobs, but stats, summary, media have"},
+      {"snapshot a b", "snapshot takes one source, but got a, b"},
+      {"diff a b",
+       "a is no kind of capture that diff knows: kspdump diff KIND OLD NEW, KIND being one of stats"},
+      {"diff stats a", "diff takes two captures, OLD NEW, but got a"},
+      {"keys snapshot", "snapshot is no kind of capture that keys knows: "},
+      {"keys stats a b", "keys takes one pattern, but got a, b"},
+  };
+  for (const auto& [arguments, said] : cases) {
+    const Outcome result = run(arguments);
+    EXPECT_EQ(result.status, 2) << arguments;
+    EXPECT_EQ(result.err.substr(0, 9 + std::strlen(said)), std::string("kspdump: ") + said) << arguments;
+  }
+}
+
+TEST_F(Kspdump, HelpIsToldInEightyColumnsWithItsDefaults) {
   EXPECT_EQ(run("--version").out, "kspdump " KSP_VERSION "\n");
-  EXPECT_EQ(run("stats --help").status, 0);
+  EXPECT_EQ(run("diff --version").out, "kspdump " KSP_VERSION "\n");
+  for (const char* command : {"", "stats", "summary", "media", "snapshot", "diff", "identify", "keys"}) {
+    const Outcome help = run(std::string(command) + " --help");
+    EXPECT_EQ(help.status, 0) << command;
+    std::istringstream lines(help.out);
+    for (std::string line; std::getline(lines, line);) EXPECT_LE(line.size(), 80u) << line;
+    EXPECT_TRUE(*command == '\0' || help.out.find("(default: standard output)") != std::string::npos);
+    EXPECT_EQ(run(std::string(command) + " --help >/dev/full").status, 3) << command;
+  }
+}
+
+TEST_F(Kspdump, RecordsAreSelectedByNameAndKey) {
+  write("a.stats",
+        record(4, {1}) + record(5, {2}) + record(14, {0, 1, 2, 3, 4, 5, 6, 7, 8, 9}) + record(20, {3}));
+  const struct {
+    const char* options;
+    const char* keys;
+    const char* finding;
+  } cases[] = {
+      {"--match 'host*'", "[4,5,14]", ""},
+      {"--match 'HOST*s' --ignore-case", "[4]", ""},
+      {"--match 'HOST*s'", "[]", "--match HOST*s selects nothing"},
+      {"--match bandErases --match '*Dyn'", "[5,20]", ""},
+      {"--key 5-14 --key 20", "[5,14,20]", ""},
+      {"--key 6-13 --match hostWrites", "[4]", "--key 6-13 selects nothing"},
+      {"--key 7", "[]", "--key 7 selects nothing"},
+  };
+  for (const auto& [options, keys, finding] : cases) {
+    const Outcome result = run(std::string("stats --format json ") + options + " a.stats");
+    const json document = json::parse(result.out);
+    json shown = json::array();
+    for (const json& each : document["records"]) shown.push_back(each["key"]);
+    EXPECT_EQ(shown, json::parse(keys)) << options;
+    EXPECT_EQ(document["findings"].empty() ? "" : document["findings"][0]["reason"], finding) << options;
+    EXPECT_EQ(result.status, *finding == '\0' ? 0 : 1) << options;
+  }
+}
+
+TEST_F(Kspdump, ExpandedArraysHaveARowAnElement) {
+  write("a.stats", record(298, {1, 3}));
+  const Outcome result = shell("LC_ALL=C $KSPDUMP stats --expand a.stats");
+  EXPECT_EQ(result.out,
+            "a.stats: statistics, 24 bytes, 1 record\n"
+            "  KEY  NAME          VALUE/SUM  ELEMENTS\n"
+            "  298  perHostReads          4  -@\n"
+            "       [0]                   1   25.0 %  #############\n"
+            "       [1]                   3   75.0 %  #######################################\n");
+}
+
+TEST_F(Kspdump, OnATerminalColumnsHoldAndFewRecordsAreExpanded) {
+  write("a.media", media(4121, numbers<4>({1, 2, 3, 4, 5, 6, 7, 8, 9, 10})) + media(4096, numbers<4>({7})) +
+                       media(4097, numbers<4>({7})) + media(4098, numbers<4>({7})));
+  const std::string terminal = "script -qec \"stty cols 60; LC_ALL=C.UTF-8 $KSPDUMP media ";
+  const Outcome four = shell(terminal + "a.media\" /dev/null");
+  EXPECT_NE(four.out.find(" slipTrackingAfte…dVthInTicksHist "), std::string::npos) << four.out;
+  EXPECT_EQ(four.out.find("[0]"), std::string::npos);
+  EXPECT_NE(shell(terminal + "--key 4121 a.media\" /dev/null").out.find("[0]"), std::string::npos);
+  EXPECT_NE(run("media a.media").out.find(" slipTrackingAfterFs1ForceFailChangedVthInTicksHist  "),
+            std::string::npos);
+}
+
+TEST_F(Kspdump, KeysAndKindsAreListed) {
+  EXPECT_EQ(run("keys stats 'host*Histo'").out,
+            "KEY  NAME               ELEMENTS  WIDTH\n"
+            " 14  hostWriteLogHisto        10      8\n"
+            " 15  hostReadLogHisto         10      8\n");
+  EXPECT_EQ(run("keys media --format csv fw_version_identifier").out,
+            "key,name,elements,width\n16384,fw_version_identifier,1,8\n");
+  EXPECT_EQ(run("keys stats --ignore-case --format json VERSION").out,
+            "{\"key\":1,\"name\":\"version\",\"elements\":1,\"width\":8}\n");
+  EXPECT_EQ(run("keys stats nonsense").status, 1);
+
+  write("s", record(14, {0, 1, 2, 3, 4, 5, 6, 7, 8, 9}) + record(900, {1, 2}));
+  write("m", media(4096, numbers<4>({7})));
+  write("t", interval(1) + interval(2));
+  write("n", "this is not a capture but a text that is quite long enough to be one");
+  const Outcome result = run("identify --format json s m t n missing");
+  EXPECT_EQ(result.out,
+            "{\"source\":\"s\",\"kind\":\"stats\",\"recognised\":78,\"bytes\":112}\n"
+            "{\"source\":\"m\",\"kind\":\"media\",\"recognised\":100,\"bytes\":8}\n"
+            "{\"source\":\"t\",\"kind\":\"snapshot\",\"recognised\":100,\"bytes\":504}\n"
+            "{\"source\":\"n\",\"kind\":\"unknown\",\"recognised\":0,\"bytes\":68}\n");
+  EXPECT_EQ(result.status, 3);
+  EXPECT_EQ(run("identify s n").status, 1);
+}
+
+TEST_F(Kspdump, NoiseIsNoSoundCapture) {
+  uint64_t state = 1;
+  for (const size_t size : {size_t{64}, size_t{504}, size_t{2520}, size_t{65536}}) {
+    for (int round = 0; round < 20; ++round) {
+      std::string noise;
+      while (noise.size() < size)
+        noise += static_cast<char>((state = state * 6364136223846793005 + 1442695040888963407) >> 56);
+      write("noise", noise);
+      for (const char* kind : {"stats", "summary", "media", "snapshot"}) {
+        ASSERT_EQ(run(std::string(kind) + " --format csv noise").status, 1) << kind << size;
+      }
+    }
+  }
 }
 
 TEST_F(Kspdump, NamesStandForThemselves) {
-  write("[a]", "");
-  EXPECT_EQ(run("stats --format csv '[a]'").err, "kspdump: ./[a]: offset 0: the capture is empty\n");
+  for (const std::string name : {"[a]", "[a,b]", "++", "--help"}) {
+    write(name, record(4, {1}));
+    const Outcome result = run("stats --format json -- " + name);
+    EXPECT_EQ(json::parse(result.out)["source"], name);
+    if (name != "--help") {
+      EXPECT_EQ(run("stats --format json " + name).out, result.out);
+    }
+  }
   write("\xC3\xA4\xFF\x9B", "");
   const Outcome named = shell("LC_ALL=C.UTF-8 $KSPDUMP stats --format json *'\xFF'*");
   EXPECT_EQ(json::parse(named.out)["source"], "\xC3\xA4\\xff\\x9b");

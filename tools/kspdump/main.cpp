@@ -1,135 +1,421 @@
-// kspdump: decodes captures of the controller's exports for people and programs.
+// kspdump: decodes captures of the controller's exports for people and programs. This file reads the command
+// line.
 
 #include <fcntl.h>
+#include <getopt.h>
 #include <unistd.h>
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
+#include <charconv>
 #include <clocale>
 #include <cstdio>
+#include <new>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "tools/kspdump/in_order.h"
 #include "tools/kspdump/run.h"
+#include "tools/kspdump/view/output.h"
 #include "tools/kspdump/view/text.h"
 
 namespace {
 
 using namespace kspdump;
 
+/// Sets of commands.
+enum : unsigned {
+  kStats = 1,
+  kSummary = 2,
+  kMedia = 4,
+  kSnapshot = 8,
+  kDiff = 16,
+  kIdentify = 32,
+  kKeys = 64,
+  kMany = kStats | kSummary | kMedia,
+  kDecoders = kMany | kSnapshot,
+  kSelecting = kDecoders | kDiff,
+  kReading = kSelecting | kIdentify,
+  kAll = kReading | kKeys,
+};
+
+struct Command {
+  std::string_view name;
+  unsigned bit;
+  const char* arguments;
+  const char* summary;
+  Subject subject;
+};
+
+constexpr Command kCommands[] = {
+    {"stats", kStats, "SOURCE...", "Decode statistics streams", Subject::kStatistics},
+    {"summary", kSummary, "SOURCE...", "Decode the summary block of statistics streams",
+     Subject::kStatistics},
+    {"media", kMedia, "SOURCE...", "Decode media statistics streams", Subject::kStatistics},
+    {"snapshot", kSnapshot, "SOURCE", "Show a snapshot: the fixed layout, or a header's", Subject::kSnapshot},
+    {"diff", kDiff, "stats|summary|media OLD NEW", "Show what changed between two captures",
+     Subject::kDifference},
+    {"identify", kIdentify, "SOURCE...", "Tell which kind of capture each is", Subject::kListing},
+    {"keys", kKeys, "stats|media [GLOB]", "List the keys that have a name", Subject::kListing},
+};
+
+/// What the words of a command line come to before they are made into options of the program.
+struct Wanted {
+  const Command* command = nullptr;
+  std::string_view form;
+  Options options;
+};
+
+/// How an option is understood: the rest of a sentence that begins with its name and says what is wrong with
+/// the value; empty when nothing is.
+using Take = std::string (*)(Wanted& wanted, const std::string& value);
+
+struct OptionRow {
+  const char* name;
+  /// What its value is called; null for none.
+  const char* value;
+  unsigned commands;
+  const char* help;
+  /// What holds without the option.
+  const char* usual;
+  Take take;
+};
+
+/// The names of a subject's forms, a blank in front of each.
+std::string formNames(Subject subject) {
+  std::string names;
+  for (const Form* form : formsFor(subject)) names.append(" ").append(form->name);
+  return names;
+}
+
+template <class Number>
+bool readNumber(std::string_view text, Number& number) {
+  const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), number);
+  return error == std::errc() && end == text.data() + text.size();
+}
+
+std::string takeJobs(Wanted& wanted, const std::string& value) {
+  constexpr size_t kMostJobs = 1024;
+  size_t jobs = 0;
+  if (!readNumber(value, jobs) || jobs < 1 || jobs > kMostJobs) return "takes a number from 1 to 1024";
+  wanted.options.jobs = jobs;
+  return "";
+}
+
+std::string takeSize(Wanted& wanted, const std::string& value) {
+  constexpr std::string_view kUnits = "KMG";
+  constexpr unsigned kUnitBits = 10;
+  std::string_view number = value;
+  unsigned shift = 0;
+  if (const size_t unit = kUnits.find(number.back()); unit != std::string_view::npos) {
+    shift = kUnitBits * static_cast<unsigned>(unit + 1);
+    number.remove_suffix(1);
+  }
+  uint64_t size = 0;
+  if (!readNumber(number, size) || size == 0 || size > Reading::kUtmostGreatest >> shift) {
+    return "takes a number of bytes below 4G, K, M or G behind it or not";
+  }
+  wanted.options.mostBytes = size << shift;
+  return "";
+}
+
+constexpr OptionRow kOptions[] = {
+    {"format", "FORM", kAll, "How to show it", nullptr,
+     [](Wanted& wanted, const std::string& value) -> std::string {
+       wanted.form = value;
+       for (const Form* form : formsFor(wanted.command->subject)) {
+         if (form->name == value) {
+           wanted.options.form = form;
+           return "";
+         }
+       }
+       return "knows no " + printable(value) + " here, but" + formNames(wanted.command->subject);
+     }},
+    {"match", "GLOB", kSelecting, "Only records whose name matches; may come again", "all",
+     [](Wanted& wanted, const std::string& value) -> std::string {
+       wanted.options.decoding.selection.addPattern(value);
+       return "";
+     }},
+    {"key", "N[-M]", kSelecting, "Only records of these keys; may come again", "all",
+     [](Wanted& wanted, const std::string& value) -> std::string {
+       return wanted.options.decoding.selection.addKeys(value) ? "" : "takes N or N-M";
+     }},
+    {"ignore-case", nullptr, kSelecting | kKeys, "Match names in upper and lower case alike", "exactly",
+     [](Wanted& wanted, const std::string&) -> std::string {
+       wanted.options.decoding.selection.ignoreCase();
+       return "";
+     }},
+    {"expand", nullptr, kDecoders, "In tables, a row for each element of an array",
+     "on a terminal, for three records or fewer",
+     [](Wanted& wanted, const std::string&) -> std::string {
+       wanted.options.expands = true;
+       return "";
+     }},
+    {"numbers", nullptr, kStats, "Name records by their key number", "by name",
+     [](Wanted& wanted, const std::string&) -> std::string {
+       wanted.options.decoding.byNumber = true;
+       return "";
+     }},
+    {"header", "FILE", kSnapshot, "Header that describes the records", "the fixed layout",
+     [](Wanted& wanted, const std::string& value) -> std::string {
+       wanted.options.header = value;
+       return "";
+     }},
+    {"label", "NAME", kReading, "What standard input is called", "-",
+     [](Wanted& wanted, const std::string& value) -> std::string {
+       wanted.options.label = value;
+       return "";
+     }},
+    {"files0-from", "LIST", kMany | kIdentify, "More sources, NUL-terminated, from a file or -", "none",
+     [](Wanted& wanted, const std::string& value) -> std::string {
+       wanted.options.sourcesFrom = value;
+       return "";
+     }},
+    {"max-size", "SIZE", kReading, "The greatest capture that is read", "256M", takeSize},
+    {"jobs", "N", kMany, "Captures decoded at a time", "one a core", takeJobs},
+    {"output", "FILE", kAll, "Write to a file", "standard output",
+     [](Wanted& wanted, const std::string& value) -> std::string {
+       wanted.options.output = value;
+       return "";
+     }},
+    {"force", nullptr, kAll, "Let --output replace a capture", "refuse",
+     [](Wanted& wanted, const std::string&) -> std::string {
+       wanted.options.overwrites = true;
+       return "";
+     }},
+};
+
+std::string namesOf(unsigned commands) {
+  std::string names;
+  for (const Command& command : kCommands) {
+    if ((command.bit & commands) != 0) names.append(names.empty() ? "" : ", ").append(command.name);
+  }
+  return names;
+}
+
+std::string defaultForm(Subject subject) {
+  const std::string first(formsFor(subject).front()->name);
+  return subject == Subject::kSnapshot ? first + "; table with --match or --key" : first;
+}
+
+std::string help(const Command* command) {
+  std::string text;
+  const auto addLine = [&](const std::string& left, const std::string& right) {
+    constexpr size_t kLeft = 24;
+    text += "  " + left;
+    if (left.size() >= kLeft) text += "\n  " + std::string(kLeft, ' ');
+    text.append(left.size() < kLeft ? kLeft - left.size() : 0, ' ').append(right).append("\n");
+  };
+  if (command == nullptr) {
+    text =
+        "kspdump decodes captures of a flash storage controller's exports.\n\n"
+        "usage: kspdump COMMAND [OPTION...] [--] SOURCE...\n\ncommands:\n";
+    for (const Command& each : kCommands) {
+      addLine(std::string(each.name), each.summary);
+      addLine("", std::string(each.arguments));
+    }
+    text += "\n  kspdump COMMAND --help tells the options of each.\n";
+  } else {
+    text.append(command->summary).append(".\n\nusage: kspdump ").append(command->name);
+    text.append(" [OPTION...] [--] ").append(command->arguments).append("\n\noptions:\n");
+    for (const OptionRow& row : kOptions) {
+      if ((row.commands & command->bit) == 0) continue;
+      const std::string left = std::string("--") + row.name + (row.value ? std::string(" ") + row.value : "");
+      if (row.usual != nullptr) {
+        addLine(left, row.help);
+        addLine("", std::string("(default: ") + row.usual + ")");
+        continue;
+      }
+      addLine(left, row.help + (":" + formNames(command->subject)));
+      addLine("", "(default: " + defaultForm(command->subject) + ")");
+    }
+    addLine("--help, --version", "");
+  }
+  return text +
+         "\nSOURCE is a file, a folder, an archive, or - for standard input. Exit status:\n"
+         "0 clean, 1 decoded with findings, 2 wrong usage, 3 something could not be read\n"
+         "or written.\n";
+}
+
+/// Ends the program with a text that was asked for.
+struct Told {
+  std::string text;
+};
+
 class CommandLine {
  public:
-  explicit CommandLine(Options& options) : options_(options) {
-    options_.jobs = usableCores();
-    app_.set_version_flag("--version", kVersion);
-    app_.require_subcommand(1);
-    app_.footer(
-        "FILE may be - for standard input. Exit status: 0 clean, 1 decoded with findings,\n"
-        "which are named on standard error, 2 wrong usage, 3 a file could not be read or\n"
-        "written.");
+  CommandLine(int argc, char** argv) : words_(argv, argv + argc) { wanted_.options.jobs = usableCores(); }
 
-    CLI::App* stats = addMany("stats", "Decode statistics streams", Kind::kStats);
-    stats->add_flag("--numbers", options_.decoding.byNumber, "Name records by their key number");
-    addMany("summary", "Decode the summary block of statistics streams", Kind::kSummary);
-    addMany("media", "Decode media statistics streams", Kind::kMedia);
-    CLI::App* snapshot =
-        app_.add_subcommand("snapshot", "Render a snapshot: the fixed layout, or a header's");
-    snapshot->add_option("FILE", options_.sources, "The capture")->required()->expected(1)->type_name("");
-    snapshot->add_option("--header", options_.header, "Header that describes the records")
-        ->type_name("HEADER");
-    addCommon(*snapshot, Kind::kSnapshot, Subject::kSnapshot);
-
-    CLI::App* diff = app_.add_subcommand("diff", "Show what changed between two captures");
-    diff->require_subcommand(1);
-    for (const auto& [name, kind] : {std::pair{"stats", Kind::kStats}, std::pair{"media", Kind::kMedia}}) {
-      CLI::App* what = diff->add_subcommand(name, std::string("Compare two ") + name + " captures");
-      what->add_option("OLD NEW", options_.sources, "The two captures")
-          ->required()
-          ->expected(2)
-          ->type_name("");
-      addCommon(*what, kind, Subject::kDifference);
+  /// Throws UsageError or Told.
+  Options parse() {
+    takeCommand();
+    takeOptions();
+    takeArguments();
+    Options& options = wanted_.options;
+    if (options.form == nullptr) {
+      const bool isPart =
+          wanted_.command->subject == Subject::kSnapshot && !options.decoding.selection.isEmpty();
+      options.form =
+          isPart ? findForm("table", Subject::kSnapshot) : formsFor(wanted_.command->subject).front();
     }
-  }
-
-  /// Returns the exit status where the program ends with its command line, else -1.
-  int parse(int argc, char** argv) {
-    std::vector<std::string> words(argv + 1, argv + argc);
-    std::string wrong = prepare(words);
-    if (wrong.empty()) {
-      std::reverse(words.begin(), words.end());
-      try {
-        app_.parse(words);
-        return -1;
-      } catch (const CLI::Success& success) {
-        return app_.exit(success);
-      } catch (const CLI::ParseError& error) {
-        wrong = error.what();
-      }
-    }
-    std::fprintf(stderr, "kspdump: %s; kspdump --help tells more\n", printable(wrong).c_str());
-    return kUsage;
+    return options;
   }
 
  private:
-  /// Looks at the words for what the parser would take in another sense than people mean it: an option with
-  /// nothing behind its equals sign is no option of the next word, and a file may be named like a list.
-  std::string prepare(std::vector<std::string>& words) const {
-    const std::string commands = "there are stats, summary, media, snapshot and diff";
-    bool isValue = false;
-    bool hasCommand = false;
-    for (std::string& word : words) {
-      if (word == "--") break;
-      if (word.starts_with("--") && word.ends_with("=")) return word + " has no value";
-      if (!hasCommand && !word.starts_with("-")) {
-        if (std::find(std::begin(kCommands), std::end(kCommands), word) == std::end(kCommands))
-          return std::string("there is no command ").append(word).append("; ").append(commands);
-        hasCommand = true;
-      }
-      if (!isValue && (word == "++" || (word.starts_with("[") && word.ends_with("]")))) word.insert(0, "./");
-      isValue = std::find(std::begin(kWithValue), std::end(kWithValue), word) != std::end(kWithValue);
+  void takeCommand() {
+    const std::string known = "there are " + namesOf(kAll);
+    if (words_.size() < 2) throw UsageError("a command is missing; " + known);
+    const std::string_view word = words_[1];
+    if (word == "--help" || word == "-h") throw Told{help(nullptr)};
+    if (word == "--version") throw Told{kVersion};
+    for (const Command& command : kCommands) {
+      if (command.name == word) wanted_.command = &command;
     }
-    return hasCommand || !words.empty() ? "" : "a command is missing; " + commands;
-  }
-
-  CLI::App* addMany(const char* name, const char* description, Kind kind) {
-    CLI::App* command = app_.add_subcommand(name, description);
-    command->add_option("FILE", options_.sources, "Captures")->required()->type_name("");
-    command->add_option("--jobs", options_.jobs, "Files decoded at a time; all cores by default")
-        ->check(CLI::Range(1, 1024))
-        ->option_text("N");
-    addCommon(*command, kind, Subject::kStatistics);
-    return command;
-  }
-
-  void addCommon(CLI::App& command, Kind kind, Subject subject) {
-    std::vector<std::string> names;
-    for (const Form* form : formsFor(subject)) names.emplace_back(form->name);
-    command.add_option("--format", format_, CLI::detail::join(names, ", "))
-        ->check(CLI::IsMember(names))
-        ->option_text("FORMAT");
-    command.add_option("--match", options_.decoding.match, "Only records whose name matches the pattern")
-        ->type_name("GLOB");
-    command.add_option("--output", options_.output, "Write to a file instead of standard output")
-        ->type_name("FILE");
-    command.set_version_flag("--version", kVersion);
-    command.callback([this, kind, subject] {
-      options_.decoding.kind = kind;
-      options_.subject = subject;
-      // The report shows all of a snapshot.
-      const bool isPart = subject == Subject::kSnapshot && !options_.decoding.match.empty();
-      if (format_.empty()) format_ = isPart ? "table" : formsFor(subject).front()->name;
-      options_.form = findForm(format_, subject);
+    if (wanted_.command != nullptr) return;
+    const bool isOption = word.starts_with("-") && word != "-";
+    const auto behind = std::find_if(words_.begin() + 2, words_.end(), [](std::string_view each) {
+      return std::any_of(std::begin(kCommands), std::end(kCommands),
+                         [&](const Command& command) { return command.name == each; });
     });
+    if (isOption && behind != words_.end()) {
+      throw UsageError(printable(word) + " stands in front of the command: kspdump " + *behind + " " +
+                       printable(word) + " ...");
+    }
+    if (isOption) throw UsageError(printable(word) + " stands where a command is missing; " + known);
+    throw UsageError("there is no command " + printable(word) + "; " + known);
   }
 
-  static constexpr const char* kVersion = "kspdump " KSP_VERSION;
-  static constexpr const char* kCommands[] = {"stats", "summary", "media", "snapshot", "diff"};
-  static constexpr const char* kWithValue[] = {"--format", "--match", "--output", "--jobs", "--header"};
+  void takeOptions() {
+    constexpr int kFirst = 256;
+    constexpr int kHelp = kFirst - 1;
+    constexpr int kShowVersion = kFirst - 2;
+    std::vector<option> options = {{"help", no_argument, nullptr, kHelp},
+                                   {"version", no_argument, nullptr, kShowVersion}};
+    for (const OptionRow& row : kOptions) {
+      const auto number = static_cast<int>(&row - kOptions);
+      options.push_back(
+          {row.name, row.value != nullptr ? required_argument : no_argument, nullptr, kFirst + number});
+    }
+    options.push_back({});
+    // The command is the program's name in what follows.
+    const int count = static_cast<int>(words_.size()) - 1;
+    std::vector<char*> words;
+    for (size_t i = 1; i < words_.size(); ++i) words.push_back(words_[i]);
+    words.push_back(nullptr);
+    opterr = 0;
+    for (int got = 0; (got = getopt_long(count, words.data(), ":h", options.data(), nullptr)) != -1;) {
+      if (got == kHelp || got == 'h') throw Told{help(wanted_.command)};
+      if (got == kShowVersion) throw Told{kVersion};
+      if (got == ':') throw UsageError(withoutValue(kOptions[optopt - kFirst], "no"));
+      if (got == '?') refuse(words[static_cast<size_t>(optind) - 1]);
+      takeOption(kOptions[got - kFirst], optarg != nullptr ? optarg : "");
+    }
+    arguments_.assign(words.begin() + optind, words.end() - 1);
+  }
 
-  Options& options_;
-  std::string format_;
-  CLI::App app_{"Decodes captures of a flash storage controller's exports.", "kspdump"};
+  [[noreturn]] void refuse(const std::string& word) const {
+    if (optopt != 0 && word.starts_with("--")) {
+      throw UsageError(printable(word.substr(0, word.find('='))) + " takes no value, so not " +
+                       printable(word));
+    }
+    const std::string option = word.starts_with("--") ? word : std::string("-") + static_cast<char>(optopt);
+    throw UsageError("there is no option " + printable(option));
+  }
+
+  [[nodiscard]] std::string withoutValue(const OptionRow& row, const std::string& which) const {
+    const std::string option = std::string("--") + row.name;
+    std::string text = option + " has " + which + " value: " + option + " " + row.value;
+    if (row.usual == nullptr) text += ", one of" + formNames(wanted_.command->subject);
+    return text;
+  }
+
+  void takeOption(const OptionRow& row, const std::string& value) {
+    const std::string name = std::string("--") + row.name;
+    if ((row.commands & wanted_.command->bit) == 0) {
+      throw UsageError(std::string(wanted_.command->name) + " has no option " + name + ", but " +
+                       namesOf(row.commands) +
+                       (namesOf(row.commands).find(',') == std::string::npos ? " has" : " have"));
+    }
+    if (row.value != nullptr && value.empty()) throw UsageError(withoutValue(row, "an empty"));
+    const std::string wrong = row.take(wanted_, value);
+    if (!wrong.empty()) throw UsageError(name + " " + wrong);
+  }
+
+  void takeArguments() {
+    Options& options = wanted_.options;
+    switch (wanted_.command->bit) {
+      case kStats:
+        options.decoding.kind = Kind::kStats;
+        return takeSources();
+      case kSummary:
+        options.decoding.kind = Kind::kSummary;
+        return takeSources();
+      case kMedia:
+        options.decoding.kind = Kind::kMedia;
+        return takeSources();
+      case kSnapshot:
+        options.decoding.kind = Kind::kSnapshot;
+        takeSources();
+        if (options.sources.size() != 1) throw UsageError("snapshot takes one source, but got " + listed());
+        return;
+      case kDiff:
+        options.task = Task::kDifference;
+        takeKind("OLD NEW", kMany);
+        options.sources = arguments_;
+        if (arguments_.size() != 2) {
+          throw UsageError("diff takes two captures, OLD NEW, but got " + listed());
+        }
+        return;
+      case kIdentify:
+        options.task = Task::kIdentify;
+        return takeSources();
+      default:
+        options.task = Task::kKeys;
+        takeKind("[GLOB]", kStats | kMedia);
+        if (arguments_.size() > 1) throw UsageError("keys takes one pattern, but got " + listed());
+        if (!arguments_.empty()) options.decoding.selection.addPattern(arguments_.front());
+    }
+  }
+
+  void takeSources() {
+    wanted_.options.sources = arguments_;
+    if (arguments_.empty() && wanted_.options.sourcesFrom.empty()) {
+      throw UsageError(std::string(wanted_.command->name) +
+                       " has no source: a file, or - for standard input");
+    }
+    if (std::find(arguments_.begin(), arguments_.end(), "") != arguments_.end()) {
+      throw UsageError("a source has an empty name");
+    }
+  }
+
+  /// The word behind a command that says what is in its captures.
+  void takeKind(const std::string& rest, unsigned commands) {
+    const std::string command(wanted_.command->name);
+    const std::string usage =
+        ": kspdump " + command + " KIND " + rest + ", KIND being one of " + namesOf(commands);
+    if (arguments_.empty()) throw UsageError(command + " has no kind of capture" + usage);
+    const std::string word = arguments_.front();
+    for (const Kind kind : {Kind::kStats, Kind::kSummary, Kind::kMedia}) {
+      if (kindName(kind) != word || ((1U << static_cast<unsigned>(kind)) & commands) == 0) continue;
+      wanted_.options.decoding.kind = kind;
+      arguments_.erase(arguments_.begin());
+      return;
+    }
+    throw UsageError(printable(word) + " is no kind of capture that " + command + " knows" + usage);
+  }
+
+  [[nodiscard]] std::string listed() const {
+    if (arguments_.empty()) return "none";
+    std::string text;
+    for (const std::string& word : arguments_) text.append(text.empty() ? "" : ", ").append(printable(word));
+    return text;
+  }
+
+  static constexpr const char* kVersion = "kspdump " KSP_VERSION "\n";
+
+  std::vector<char*> words_;
+  std::vector<std::string> arguments_;
+  Wanted wanted_;
 };
 
 /// A closed standard stream stays unusable, instead of becoming the next file that is opened.
@@ -139,16 +425,26 @@ void keepStandardDescriptors() {
   }
 }
 
+int runOrTell(int argc, char** argv) {
+  try {
+    return run(CommandLine(argc, argv).parse());
+  } catch (const Told& told) {
+    Output output("");
+    output.write(told.text);
+    return kClean;
+  } catch (const UsageError& error) {
+    std::fprintf(stderr, "kspdump: %s; kspdump --help tells more\n", error.what());
+    return kUsage;
+  }
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
   try {
     keepStandardDescriptors();
     std::setlocale(LC_CTYPE, "");
-    Options options;
-    CommandLine commandLine(options);
-    const int ended = commandLine.parse(argc, argv);
-    return ended >= 0 ? ended : run(options);
+    return runOrTell(argc, argv);
   } catch (const std::bad_alloc&) {
     std::fputs("kspdump: out of memory\n", stderr);
   } catch (const std::exception& error) {

@@ -3,14 +3,18 @@
 #include "tools/kspdump/run.h"
 
 #include <sys/ioctl.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <charconv>
 #include <chrono>
 #include <cstdio>
+#include <cstdlib>
 #include <memory>
 #include <new>
 
+#include "ksp/records.hpp"
 #include "tools/kspdump/decode/recognise.h"
 #include "tools/kspdump/decode/snapshot.h"
 #include "tools/kspdump/in_order.h"
@@ -22,11 +26,17 @@ namespace kspdump {
 
 namespace {
 
-size_t terminalWidth() {
+/// Columns of the terminal that the results go to or, where there is none, as the environment says.
+size_t lineWidth() {
   constexpr size_t kUsual = 80;
+  constexpr size_t kMost = 10000;
   winsize size = {};
   if (ioctl(STDOUT_FILENO, TIOCGWINSZ, &size) == 0 && size.ws_col != 0) return size.ws_col;
-  return kUsual;
+  const char* const columns = std::getenv("COLUMNS");
+  const std::string_view text = columns != nullptr ? columns : "";
+  size_t width = 0;
+  std::from_chars(text.data(), text.data() + text.size(), width);
+  return width == 0 ? kUsual : std::min(width, kMost);
 }
 
 /// How many captures are shown, on one line of a terminal that the results are not written to.
@@ -60,7 +70,7 @@ class Progress {
 };
 
 void complain(const std::string& source, const std::string& text) {
-  std::fprintf(stderr, "kspdump: %s: %s\n", printable(source).c_str(), text.c_str());
+  std::fprintf(stderr, "kspdump: %s: %s\n", printable(source).c_str(), printable(text).c_str());
 }
 
 /// Names a capture's findings on standard error.
@@ -230,7 +240,7 @@ Result showSeries(const Options& options, const ViewOptions& viewOptions, Output
     if (!view->showsFindings()) tell(capture.source, capture.findings, capture.furtherFindings);
   }
   if (!result.isDecoded) return result;
-  if (options.subject == Subject::kDifference) {
+  if (options.task == Task::kDifference) {
     view->difference(series);
   } else {
     view->trend(series);
@@ -239,10 +249,107 @@ Result showSeries(const Options& options, const ViewOptions& viewOptions, Output
   return result;
 }
 
+/// The keys of one stream's table that are selected.
+void addKeys(Listing& listing, std::span<const ksp::KeyEntry> rows, const Selection& selection,
+             std::vector<bool>& used) {
+  for (const ksp::KeyEntry& row : rows) {
+    const std::string_view name = row.name;
+    if (!selection.selects(name, row.key, used)) continue;
+    listing.rows.push_back({uint64_t{row.key}, std::string(name), uint64_t{row.count}, uint64_t{row.width}});
+  }
+}
+
+Result listKeys(const Options& options, const ViewOptions& viewOptions, Output& output) {
+  const Selection& selection = options.decoding.selection;
+  Listing listing = {{{"key", ""}, {"name", ""}, {"elements", ""}, {"width", ""}}, {}};
+  std::vector<bool> used(selection.size());
+  if (options.decoding.kind == Kind::kMedia) {
+    addKeys(listing, ksp::mspKeyTable, selection, used);
+  } else {
+    addKeys(listing, ksp::kStatsKeys, selection, used);
+  }
+  Sink sink;
+  options.form->make(viewOptions, sink)->listing(listing);
+  output.write(sink.text);
+  if (!listing.rows.empty()) return {.status = kClean, .isDecoded = true};
+  std::fprintf(stderr, "kspdump: %s\n", printable(selection.text(0) + " selects nothing").c_str());
+  return {.status = kFindings, .isDecoded = true};
+}
+
+/// Lists what each capture is, those of folders and archives too.
+Result identifyCaptures(const Options& options, const ViewOptions& viewOptions, Output& output) {
+  Listing listing = {{{"source", ""}, {"kind", ""}, {"recognised", " %"}, {"bytes", ""}}, {}};
+  Result result;
+  const auto add = [&](const std::string& name, const std::optional<Recognised>& recognised, uint64_t bytes) {
+    result.isDecoded = true;
+    if (!recognised) result.status = std::max<int>(result.status, kFindings);
+    listing.rows.push_back({name, std::string(recognised ? kindName(recognised->kind) : "unknown"),
+                            uint64_t{recognised ? recognised->share.percent() : 0}, bytes});
+  };
+  const auto makeShow = [&](Lane& lane) -> ShowInput {
+    return [&](Input& input) {
+      if (input.state == Input::State::kFault) {
+        return lane.then([&result, name = input.name, fault = input.fault] {
+          complain(name, "cannot be read: " + fault);
+          result.status = kUnreadable;
+        });
+      }
+      lane.then([&add, name = input.name, recognised = identify(input.bytes), bytes = input.bytes.size()] {
+        add(name, recognised, bytes);
+      });
+    };
+  };
+  showInOrder(sourcesOf(options),
+              {.reading = {.greatest = options.mostBytes,
+                           .isCapture = [](Bytes bytes) { return identify(bytes).has_value(); },
+                           .keepsOthers = true},
+               .jobs = options.jobs,
+               .makeShow = makeShow,
+               .write = [](std::string_view) {},
+               .found = [](const Found&) {}});
+  if (!result.isDecoded) return result;
+  Sink sink;
+  options.form->make(viewOptions, sink)->listing(listing);
+  output.write(sink.text);
+  return result;
+}
+
+/// Whether a path, or what a descriptor is of, is the file that `status` is of.
+bool isSame(const struct stat& status, const std::string& path) {
+  struct stat other = {};
+  const bool exists = path == "-" ? fstat(STDIN_FILENO, &other) == 0 : stat(path.c_str(), &other) == 0;
+  return exists && other.st_dev == status.st_dev && other.st_ino == status.st_ino;
+}
+
+/// Throws UsageError where writing the output would destroy what is read, or another capture.
+void guardOutput(const Options& options) {
+  struct stat status = {};
+  if (options.output.empty() || options.output == "-" || stat(options.output.c_str(), &status) != 0 ||
+      !S_ISREG(status.st_mode)) {
+    return;
+  }
+  const std::string name = "--output " + printable(options.output);
+  std::vector<std::string> inputs = options.sources;
+  for (const std::string& input : {options.header, options.sourcesFrom}) {
+    if (!input.empty()) inputs.push_back(input);
+  }
+  for (const std::string& input : inputs) {
+    if (isSame(status, input)) throw UsageError(name + " is what is read as " + printable(input));
+  }
+  if (options.overwrites) return;
+  Buffer bytes;
+  if (!readFile(options.output, bytes, {.greatest = Reading::kUtmostGreatest}).empty()) return;
+  if (const auto recognised = identify(bytes)) {
+    throw UsageError(name + " holds a capture (" + std::string(kindTitle(recognised->kind)) +
+                     "), which only --force lets it replace");
+  }
+}
+
 }  // namespace
 
 int run(const Options& asked) {
   Options options = asked;
+  guardOutput(options);
   Buffer header;
   if (!options.header.empty()) {
     std::string fault = readFile(options.header, header);
@@ -258,10 +365,22 @@ int run(const Options& asked) {
     options.decoding.header = header;
   }
   Output output(options.output);
-  const ViewOptions viewOptions = {.width = terminalWidth()};
-  const bool isSeries = options.subject == Subject::kDifference || options.subject == Subject::kTrend;
-  const Result result =
-      isSeries ? showSeries(options, viewOptions, output) : showCaptures(options, viewOptions, output);
+  const ViewOptions viewOptions = {
+      .width = lineWidth(), .isTerminal = output.isTerminal(), .expands = options.expands};
+  const auto task = [&] {
+    switch (options.task) {
+      case Task::kKeys:
+        return listKeys;
+      case Task::kIdentify:
+        return identifyCaptures;
+      case Task::kDifference:
+      case Task::kTrend:
+        return showSeries;
+      default:
+        return showCaptures;
+    }
+  }();
+  const Result result = task(options, viewOptions, output);
   if (result.isDecoded) output.finish();
   return result.status;
 }

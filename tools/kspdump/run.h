@@ -1,6 +1,7 @@
 #pragma once
 
 #include <cstdint>
+#include <stdexcept>
 #include <string>
 #include <vector>
 
@@ -13,11 +14,18 @@ namespace kspdump {
 /// Exit statuses; the greatest that applies is the program's.
 enum Status : int { kClean = 0, kFindings = 1, kUsage = 2, kUnreadable = 3 };
 
+/// What the program can do.
+enum class Task { kCaptures, kDifference, kTrend, kIdentify, kKeys };
+
 /// What the command line asks for.
 struct Options {
-  Subject subject = Subject::kStatistics;
+  Task task = Task::kCaptures;
   const Form* form = nullptr;
+  /// Of `kKeys`, whose keys, and which.
   Decoding decoding;
+  /// Whether each element of an array has a row of its own.
+  bool expands = false;
+
   /// Files, or "-" for standard input.
   std::vector<std::string> sources;
   /// What standard input is called in the results; empty for "-".
@@ -28,13 +36,23 @@ struct Options {
   uint64_t mostBytes = Reading::kUsualGreatest;
   /// File of the snapshot's header; empty for none.
   std::string header;
-  /// File to write to; empty for standard output.
-  std::string output;
   /// Captures decoded at a time.
   size_t jobs = 1;
+
+  /// File to write to; empty for standard output.
+  std::string output;
+  /// Whether that may be a capture, which is lost then.
+  bool overwrites = false;
 };
 
-/// Does what is asked for. Returns the exit status; throws std::exception where nothing more can be done.
+/// A command line that cannot be followed; the text says why.
+class UsageError : public std::runtime_error {
+ public:
+  using runtime_error::runtime_error;
+};
+
+/// Does what is asked for. Returns the exit status; throws UsageError, and any other std::exception where
+/// nothing more can be done.
 int run(const Options& options);
 
 }  // namespace kspdump

@@ -1,8 +1,5 @@
 #include "tools/kspdump/decode/decode.h"
 
-#include <fnmatch.h>
-
-#include <algorithm>
 #include <charconv>
 #include <cstring>
 
@@ -13,11 +10,10 @@ namespace kspdump {
 void Collector::add(uint64_t offset, uint32_t key, std::string_view name, bool isArray,
                     const Values& values) {
   ++capture_.recordCount;
-  const std::string& match = decoding_.match;
-  if (!match.empty() && fnmatch(match.c_str(), std::string(name).c_str(), 0) != 0) return;
+  if (!selection_.selects(name, key, used_)) return;
   ++capture_.shownCount;
   records_[count_++] = {offset, key, isArray, name, values};
-  if (count_ == kBatch) finish();
+  if (count_ == kBatch) handOn();
 }
 
 void Collector::addNumbered(uint64_t offset, uint32_t key, std::string_view prefix, bool isArray,
@@ -28,9 +24,16 @@ void Collector::addNumbered(uint64_t offset, uint32_t key, std::string_view pref
   add(offset, key, {name, static_cast<size_t>(end - name)}, isArray, values);
 }
 
-void Collector::finish() {
+void Collector::handOn() {
   if (count_ != 0) take_({records_.data(), count_});
   count_ = 0;
+}
+
+void Collector::finish() {
+  handOn();
+  for (size_t i = 0; i < used_.size(); ++i) {
+    if (!used_[i]) capture_.find(0, selection_.text(i) + " selects nothing");
+  }
 }
 
 void decode(const Decoding& decoding, Capture& capture, const TakeRecords& take) {

@@ -4,8 +4,10 @@
 #include <functional>
 #include <span>
 #include <string>
+#include <vector>
 
 #include "tools/kspdump/decode/capture.h"
+#include "tools/kspdump/decode/selection.h"
 
 namespace kspdump {
 
@@ -14,8 +16,7 @@ struct Decoding {
   Kind kind = Kind::kStats;
   /// Name statistics by their key number.
   bool byNumber = false;
-  /// Shell pattern that a record's name must match; empty keeps all.
-  std::string match;
+  Selection selection;
   /// The snapshot's header; empty for the fixed layout.
   Bytes header;
 };
@@ -31,7 +32,7 @@ void decode(const Decoding& decoding, Capture& capture, const TakeRecords& take)
 class Collector {
  public:
   Collector(Capture& capture, const Decoding& decoding, const TakeRecords& take)
-      : capture_(capture), decoding_(decoding), take_(take) {}
+      : capture_(capture), selection_(decoding.selection), take_(take), used_(selection_.size()) {}
   Collector(const Collector&) = delete;
   Collector& operator=(const Collector&) = delete;
 
@@ -42,19 +43,19 @@ class Collector {
   void addNumbered(uint64_t offset, uint32_t key, std::string_view prefix, bool isArray,
                    const Values& values);
 
-  /// Counts a record that is not shown.
-  void passOver() { ++capture_.recordCount; }
-
-  /// Hands on the last records.
+  /// Hands on the last records, and names what selected none.
   void finish();
 
  private:
+  void handOn();
+
   static constexpr size_t kBatch = 256;
   static constexpr size_t kLongestNumbered = 24;
 
   Capture& capture_;
-  const Decoding& decoding_;
+  const Selection& selection_;
   const TakeRecords& take_;
+  std::vector<bool> used_;
   size_t count_ = 0;
   std::array<Record, kBatch> records_;
   std::array<char[kLongestNumbered], kBatch> names_;

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cstddef>
+#include <cstdint>
 #include <span>
 #include <string>
 
@@ -16,6 +17,9 @@ inline constexpr unsigned kBarLevels = 8;
 
 /// The picture of a height: 0 for nothing, at most `kBarLevels`.
 const char* bar(size_t level);
+
+/// Appends a bar from the left, as long as `value` is of `largest`, which has `width` columns.
+void appendBar(std::string& out, uint64_t value, uint64_t largest, size_t width);
 
 /// Appends a picture of `values`, none negative, at most `width` characters, scaled to the largest.
 ///

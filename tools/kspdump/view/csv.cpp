@@ -66,6 +66,26 @@ class Csv : public View {
     }
   }
 
+  void listing(const Listing& listing) override {
+    std::string& out = sink_.text;
+    for (size_t i = 0; i < listing.columns.size(); ++i) {
+      out.append(i == 0 ? "" : ",").append(listing.columns[i].name);
+    }
+    out += '\n';
+    for (const auto& row : listing.rows) {
+      for (size_t i = 0; i < row.size(); ++i) {
+        if (i != 0) out += ',';
+        if (const auto* number = std::get_if<uint64_t>(&row[i])) {
+          appendNumber(out, *number);
+        } else {
+          appendCsv(out, std::get<std::string>(row[i]));
+        }
+      }
+      out += '\n';
+      sink_.offer();
+    }
+  }
+
   [[nodiscard]] bool showsFindings() const override { return false; }
 
  private:

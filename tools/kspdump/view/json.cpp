@@ -100,6 +100,24 @@ class Json : public View {
     out += "}\n";
   }
 
+  void listing(const Listing& listing) override {
+    std::string& out = sink_.text;
+    for (const auto& row : listing.rows) {
+      for (size_t i = 0; i < row.size(); ++i) {
+        out += i == 0 ? '{' : ',';
+        appendJson(out, listing.columns[i].name);
+        out += ':';
+        if (const auto* number = std::get_if<uint64_t>(&row[i])) {
+          appendNumber(out, *number);
+        } else {
+          appendJson(out, std::get<std::string>(row[i]));
+        }
+      }
+      out += "}\n";
+      sink_.offer();
+    }
+  }
+
   [[nodiscard]] bool showsFindings() const override { return true; }
 
  private:

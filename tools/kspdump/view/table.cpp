@@ -7,19 +7,16 @@
 
 #include "tools/kspdump/view/bars.h"
 #include "tools/kspdump/view/forms.h"
+#include "tools/kspdump/view/grid.h"
 #include "tools/kspdump/view/text.h"
 
 namespace kspdump {
 
 namespace {
 
-constexpr size_t kGap = 2;
-/// The widest that a name makes its column.
-constexpr size_t kWidestName = 34;
-
-void pad(std::string& out, size_t have, size_t want) {
-  out.append(want > have ? want - have : 0, ' ');
-}
+constexpr size_t kGap = Grid::kGap;
+/// Names that are cut keep so many columns.
+constexpr size_t kLeastName = 16;
 
 std::string decimal(std::optional<Wide> number, bool withSign = false) {
   if (!number) return "-";
@@ -37,16 +34,17 @@ class Table : public View {
   void measure(std::span<const Record> records) override {
     for (const Record& record : records) {
       greatestKey_ = std::max(greatestKey_, record.key);
-      nameWidth_ = std::max(nameWidth_, printable(record.name).size());
+      nameWidth_ = std::max(nameWidth_, columnsOf(shown(record.name)));
       greatestSum_ = std::max(greatestSum_, sum(record.values));
     }
   }
 
   void begin(Capture& capture) override {
+    constexpr uint64_t kFew = 3;
     std::string& out = sink_.text;
     out.append(printable(capture.source)).append(": ").append(kindTitle(capture.kind)).append(", ");
-    out += counted(capture.bytes.size(), "byte") + ", " + std::to_string(capture.recordCount) +
-           (capture.kind == Kind::kSnapshot ? " fields" : " records");
+    out += counted(capture.bytes.size(), "byte") + ", " +
+           counted(capture.recordCount, capture.kind == Kind::kSnapshot ? "field" : "record");
     if (capture.shownCount != capture.recordCount) {
       out += ", " + std::to_string(capture.shownCount) + " shown";
     }
@@ -54,35 +52,38 @@ class Table : public View {
     if (findings != 0) out += ", " + counted(findings, "finding");
     out += '\n';
     if (capture.shownCount == 0) return;
+    expands_ = options_.expands || (options_.isTerminal && capture.shownCount <= kFew);
     keyWidth_ = std::max<size_t>(kLeastKey, std::to_string(greatestKey_).size());
-    nameWidth_ = std::clamp(nameWidth_, kNameHead.size(), kWidestName);
+    nameWidth_ = std::max(nameWidth_, kNameHead.size());
     valueWidth_ = std::max(kValueHead.size(), greatestSum_.text().size());
-    const size_t used = keyWidth_ + nameWidth_ + valueWidth_ + 3 * kGap;
-    barWidth_ = options_.width > used + kLeastBars ? options_.width - used : kLeastBars;
-    pad(out, kKeyHead.size(), keyWidth_);
-    out.append(kKeyHead).append(kGap, ' ').append(kNameHead);
-    pad(out, kNameHead.size(), nameWidth_ + kGap + valueWidth_ - kValueHead.size());
-    out.append(kValueHead).append(kGap, ' ').append("ELEMENTS\n");
+    const size_t numbers = keyWidth_ + valueWidth_ + 3 * kGap + kLeastBars;
+    if (options_.isTerminal) {
+      const size_t room = options_.width > numbers ? options_.width - numbers : 0;
+      nameWidth_ = std::min(nameWidth_, std::max(room, kLeastName));
+    }
+    const size_t used = nameWidth_ + numbers - kLeastBars;
+    barWidth_ = std::max(options_.width, used + kLeastBars) - used;
+    appendPadded(out, kKeyHead, keyWidth_, true);
+    out.append(kGap, ' ');
+    appendPadded(out, kNameHead, nameWidth_, false);
+    out.append(kGap, ' ');
+    appendPadded(out, kValueHead, valueWidth_, true);
+    out.append(kGap, ' ').append("ELEMENTS\n");
   }
 
   void records(std::span<const Record> records) override {
     std::string& out = sink_.text;
     for (const Record& record : records) {
-      const std::string key = std::to_string(record.key);
-      const std::string name = printable(record.name);
       const Wide total = sum(record.values);
-      const std::string value = total.text();
-      pad(out, key.size(), keyWidth_);
-      out.append(key).append(kGap, ' ').append(name);
-      pad(out, name.size(), nameWidth_);
-      out.append(kGap, ' ');
-      pad(out, value.size(), valueWidth_);
-      out += value;
+      addCell(std::to_string(record.key), keyWidth_, true);
+      addCell(cutTo(shown(record.name), nameWidth_), nameWidth_, false);
+      appendPadded(out, total.text(), valueWidth_, true);
       if (record.isArray) {
         out.append(kGap, ' ');
         addBars(record.values, total);
       }
       out += '\n';
+      if (expands_ && record.isArray) addElements(record.values, total);
       sink_.offer();
     }
   }
@@ -95,6 +96,7 @@ class Table : public View {
   }
 
   void difference(const Series& series) override;
+  void listing(const Listing& listing) override;
 
   [[nodiscard]] bool showsFindings() const override { return true; }
 
@@ -104,14 +106,44 @@ class Table : public View {
   static constexpr std::string_view kValueHead = "VALUE/SUM";
   static constexpr size_t kLeastKey = 5;
 
-  void addChanges(const Series& series, const std::vector<size_t>& changed);
-
   void addFindings(const Capture& capture, const std::string& source) {
     for (const Finding& finding : capture.findings) {
-      sink_.text += "! " + source + "offset " + std::to_string(finding.offset) + ": " + finding.reason + "\n";
+      sink_.text += "! " + source + "offset " + std::to_string(finding.offset) + ": " +
+                    printable(finding.reason) + "\n";
     }
     if (capture.furtherFindings != 0) {
       sink_.text += "! " + source + counted(capture.furtherFindings, "further finding") + "\n";
+    }
+  }
+
+  /// A name without anything that could steer a terminal; those of tables are plain.
+  static std::string shown(std::string_view name) {
+    return isPlain(name) ? std::string(name) : printable(name);
+  }
+
+  void addCell(std::string_view text, size_t width, bool right) {
+    appendPadded(sink_.text, text, width, right);
+    sink_.text.append(kGap, ' ');
+  }
+
+  /// A row an element: its index, value, share of the sum, and a bar.
+  void addElements(const Values& values, const Wide& total) {
+    constexpr size_t kShareWidth = 7;
+    constexpr double kWhole = 100;
+    const size_t longest = std::max(barWidth_, kShareWidth + kGap + 1) - kShareWidth - kGap;
+    uint64_t largest = 0;
+    for (uint32_t i = 0; i < values.size(); ++i) largest = std::max(largest, values[i]);
+    for (uint32_t i = 0; i < values.size(); ++i) {
+      const uint64_t value = values[i];
+      const double share = value == 0 ? 0 : static_cast<double>(value) / static_cast<double>(total) * kWhole;
+      addCell("", keyWidth_, true);
+      addCell("[" + std::to_string(i) + "]", nameWidth_, false);
+      addCell(std::to_string(value), valueWidth_, true);
+      appendPadded(sink_.text, fixed(share, 1) + " %", kShareWidth, true);
+      if (value != 0) sink_.text.append(kGap, ' ');
+      appendBar(sink_.text, value, largest, longest);
+      sink_.text += '\n';
+      sink_.offer();
     }
   }
 
@@ -128,6 +160,7 @@ class Table : public View {
   }
 
   ViewOptions options_;
+  bool expands_ = false;
   uint32_t greatestKey_ = 0;
   size_t nameWidth_ = 0;
   Wide greatestSum_;
@@ -139,6 +172,7 @@ class Table : public View {
 };
 
 void Table::difference(const Series& series) {
+  constexpr size_t kName = 1;
   std::string& out = sink_.text;
   std::vector<size_t> changed;
   for (const size_t track : series.tracksInOrder()) {
@@ -146,54 +180,60 @@ void Table::difference(const Series& series) {
   }
   out += printable(series.captures().front().source) + " -> " + printable(series.captures().back().source) +
          ": " + std::to_string(changed.size()) + " changed\n";
-  addChanges(series, changed);
-  for (const Capture& capture : series.captures()) addFindings(capture, printable(capture.source) + ": ");
-}
-
-void Table::addChanges(const Series& series, const std::vector<size_t>& changed) {
-  if (changed.empty()) return;
-  constexpr size_t kNameColumn = 1;
-  std::string& out = sink_.text;
-  std::vector<std::vector<std::string>> rows = {{"KEY", "NAME", "OLD", "NEW", "DELTA"}};
+  Grid grid({{"KEY", true}, {"NAME", false}, {"OLD", true}, {"NEW", true}, {"DELTA", true}});
   for (const size_t track : changed) {
     const auto before = series.sum(track, 0);
     const auto after = series.sum(track, 1);
     std::optional<Wide> delta;
     if (before && after) delta = *after - *before;
-    rows.push_back({std::to_string(series.tracks()[track].key), printable(series.tracks()[track].name),
-                    decimal(before), decimal(after), decimal(delta, true)});
+    grid.add({std::to_string(series.tracks()[track].key), shown(series.tracks()[track].name), decimal(before),
+              decimal(after), decimal(delta, true)});
   }
-  std::vector<size_t> widths(rows[0].size());
-  for (const auto& row : rows) {
-    for (size_t i = 0; i < row.size(); ++i) widths[i] = std::max(widths[i], row[i].size());
-  }
-  size_t used = 0;
-  for (const size_t column : widths) used += column + kGap;
-  // Names give way to the numbers and to a small picture; one that is longer widens its own line.
-  constexpr size_t kLeastName = 16;
-  const size_t wanted = used + kLeastBars;
-  const size_t tooWide = wanted > options_.width ? wanted - options_.width : 0;
-  const size_t spare = widths[kNameColumn] > kLeastName ? widths[kNameColumn] - kLeastName : 0;
-  widths[kNameColumn] -= std::min(tooWide, spare);
-  used -= std::min(tooWide, spare);
-
-  for (size_t row = 0; row < rows.size(); ++row) {
-    for (size_t i = 0; i < widths.size(); ++i) {
-      const std::string& cell = rows[row][i];
-      const std::string padding(cell.size() < widths[i] ? widths[i] - cell.size() : 0, ' ');
-      out.append(i == 0 ? "" : "  ").append(i == kNameColumn ? cell + padding : padding + cell);
-    }
+  if (options_.isTerminal) grid.fit(kName, kLeastName, options_.width, kGap + kLeastBars);
+  const size_t used = grid.width() + kGap;
+  for (size_t row = 0; row < changed.size(); ++row) {
     if (row == 0) {
-      out += "  ELEMENTS";
-    } else if (const Track& track = series.tracks()[changed[row - 1]]; track.isArray) {
+      grid.appendHead(out);
+      out.append(kGap, ' ').append("ELEMENTS\n");
+    }
+    grid.appendRow(out, row);
+    if (const Track& track = series.tracks()[changed[row]]; track.isArray) {
       wide_.clear();
       for (uint32_t i = 0; i < track.elements; ++i) {
-        wide_.push_back(series.delta(changed[row - 1], i).value_or(Wide()).magnitude());
+        wide_.push_back(series.delta(changed[row], i).value_or(Wide()).magnitude());
       }
-      out += "  ";
-      appendBars<Wide>(out, wide_, options_.width > used + kLeastBars ? options_.width - used : kLeastBars);
+      out.append(kGap, ' ');
+      appendBars<Wide>(out, wide_, std::max(options_.width, used + kLeastBars) - used);
     }
     out += '\n';
+    sink_.offer();
+  }
+  for (const Capture& capture : series.captures()) addFindings(capture, printable(capture.source) + ": ");
+}
+
+void Table::listing(const Listing& listing) {
+  std::vector<Grid::Column> columns;
+  for (size_t i = 0; i < listing.columns.size(); ++i) {
+    std::string head = listing.columns[i].name;
+    for (char& c : head) c = static_cast<char>(c >= 'a' && c <= 'z' ? c - 'a' + 'A' : c);
+    const bool isNumber = !listing.rows.empty() && std::holds_alternative<uint64_t>(listing.rows.front()[i]);
+    columns.push_back({head, isNumber});
+  }
+  Grid grid(columns);
+  for (const auto& row : listing.rows) {
+    std::vector<std::string> cells;
+    for (size_t i = 0; i < row.size(); ++i) {
+      const auto* number = std::get_if<uint64_t>(&row[i]);
+      cells.push_back(number != nullptr ? std::to_string(*number) + listing.columns[i].unit
+                                        : shown(std::get<std::string>(row[i])));
+    }
+    grid.add(std::move(cells));
+  }
+  grid.appendHead(sink_.text);
+  sink_.text += '\n';
+  for (size_t row = 0; row < grid.rows(); ++row) {
+    grid.appendRow(sink_.text, row);
+    sink_.text += '\n';
     sink_.offer();
   }
 }

@@ -3,6 +3,7 @@
 #include <langinfo.h>
 
 #include <algorithm>
+#include <charconv>
 #include <nlohmann/json.hpp>
 
 namespace kspdump {
@@ -64,11 +65,17 @@ std::string spelledOutUnless(std::string_view text, MayStand mayStand) {
   return out;
 }
 
+}  // namespace
+
 bool isPlain(std::string_view text) {
   return std::all_of(text.begin(), text.end(), [](char c) { return c >= ' ' && c < 0x7F; });
 }
 
-}  // namespace
+std::string fixed(double number, int decimals) {
+  char text[512];  // any double fits
+  const auto end = std::to_chars(text, std::end(text), number, std::chars_format::fixed, decimals).ptr;
+  return {text, end};
+}
 
 std::string utf8(std::string_view text) {
   return spelledOutUnless(text, [](uint32_t character) { return character <= 0x10FFFF; });

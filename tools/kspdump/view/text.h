@@ -79,6 +79,12 @@ void appendNumber(std::string& out, Number number) {
   out.append(digits, std::to_chars(digits, digits + sizeof digits, number).ptr);
 }
 
+/// Whether a text is printable ASCII.
+bool isPlain(std::string_view text);
+
+/// A number with `decimals` digits behind its point.
+std::string fixed(double number, int decimals);
+
 /// A text as UTF-8; each byte that is not is spelled out as in \xff.
 std::string utf8(std::string_view text);
 

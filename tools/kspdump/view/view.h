@@ -11,6 +11,7 @@
 #include "tools/kspdump/decode/capture.h"
 #include "tools/kspdump/decode/decode.h"
 #include "tools/kspdump/series/series.h"
+#include "tools/kspdump/view/listing.h"
 
 namespace kspdump {
 
@@ -55,10 +56,11 @@ class View {
   /// The capture's findings are complete, but for those of the view itself.
   virtual void end(Capture& capture) = 0;
 
-  /// Shows what changed between a series' two points, or how its values went, instead of captures. A form
-  /// that has none of it is not made for it.
+  /// Instead of captures: what changed between a series' two points, how its values went, or a listing. A
+  /// form that has none of it is not made for it.
   virtual void difference(const Series& /*series*/) {}
   virtual void trend(const Series& /*series*/) {}
+  virtual void listing(const Listing& /*listing*/) {}
 
   /// Whether what is shown has the findings; where not, the program tells them on standard error.
   [[nodiscard]] virtual bool showsFindings() const = 0;
@@ -71,10 +73,14 @@ class View {
 struct ViewOptions {
   /// Columns that lines are fitted to.
   size_t width = 80;
+  /// Whether they end there: names give way then, and few records are shown in full.
+  bool isTerminal = false;
+  /// Whether each element of an array has a row of its own.
+  bool expands = false;
 };
 
 /// What a form can be asked to show.
-enum class Subject { kStatistics, kSnapshot, kDifference, kTrend };
+enum class Subject { kStatistics, kSnapshot, kDifference, kTrend, kListing };
 
 /// A form that there is. Another one is a file in this room and a row in `forms.cpp`.
 struct Form {
