@@ -60,6 +60,7 @@ TEST(Context, RefusedAppendsLeaveItAsItWas) {
   EXPECT_EQ(AddMultipleFieldsToGenericContext(context.get(), "n", source, 9, 1), 0);
   EXPECT_EQ(AddMultipleFieldsToGenericContext(context.get(), "n", source, 9, 3), 0);
   EXPECT_EQ(AddMultipleFieldsToGenericContext(context.get(), "n", source, 1, 65536), 0);
+  EXPECT_EQ(AddMultipleFieldsToGenericContext(context.get(), "n", nullptr, 4, 0), 1);
   EXPECT_EQ(AddMultipleFieldsToGenericContext(nullptr, "n", source, 1, 2), 0);
   EXPECT_EQ(AddSingleValueToGenericContext(nullptr, "", "n", 1), 0);
   EXPECT_EQ(AddMultipleFieldsToGenericContext(nullptr, "n", nullptr, 9, 0), 1);
@@ -68,19 +69,24 @@ TEST(Context, RefusedAppendsLeaveItAsItWas) {
   EXPECT_EQ(context->nameTail, nullptr);
 }
 
-TEST(Context, ReleaseMakesItFreshAgain) {
-  ReleaseGenericParserCxt(nullptr);
-  KSPReleaseContext(nullptr);
-  KSPParseContext context{};
+template <class Context>
+void refill(void (*release)(Context*)) {
+  release(nullptr);
+  Context context{};
   for (int round = 0; round < 2; ++round) {
-    AddSingleValueToGenericContext(&context.entries, "", "n", 1);
-    AddSingleValueToGenericContext(&context.entries, "", "m", 2);
-    context.reserved2 = context.hostReads = context.exportVersion = 5;
+    AddSingleValueToGenericContext(&listsOf(context), "", "n", 1);
+    AddSingleValueToGenericContext(&listsOf(context), "", "m", 2);
+    if constexpr (std::is_same_v<Context, KSPParseContext>) context.reserved2 = context.exportVersion = 5;
     EXPECT_EQ(textOf(context), "n=1 m=2");
-    for (int again = 0; again < 2; ++again) KSPReleaseContext(&context);
+    for (int again = 0; again < 2; ++again) release(&context);
     const auto* const bytes = reinterpret_cast<const unsigned char*>(&context);
-    EXPECT_TRUE(std::all_of(bytes, bytes + sizeof context, [](unsigned char byte) { return byte == 0; }));
+    EXPECT_EQ(std::count(bytes, bytes + sizeof context, 0), sizeof context);
   }
+}
+
+TEST(Context, ReleaseMakesItFreshAgain) {
+  refill(ReleaseGenericParserCxt);
+  refill(KSPReleaseContext);
 }
 
 TEST(Context, OwnersMoveTheirEntries) {
@@ -100,12 +106,26 @@ TEST(Context, OwnersMoveTheirEntries) {
 TEST(Numbers, RoundSig) {
   constexpr uint64_t kMax = ~uint64_t{0};
   using Row = std::array<uint64_t, 3>;  // value, digits, expected
-  for (const auto& [value, digits, expected] :
-       {Row{12345, 2, 12000}, Row{12500, 2, 13000}, Row{12499, 2, 12000}, Row{7, 0, 10}, Row{4, 0, 0},
-        Row{123, 5, 123}, Row{0, 3, 0}, Row{5, 1, 5}, Row{15, 1, 20}, Row{14, 1, 10}, Row{95, 1, 100},
-        Row{1000000000000000000, 0, 0}, Row{500000000000000000, 0, 1000000000000000000},
-        Row{999999999999999999, 18, 1000000000000000000}, Row{kMax, 4, kMax}, Row{kMax, kMax, kMax},
-        Row{kMax, 2, 18000000000000000000U}}) {
+  for (const auto& [value, digits, expected] : {Row{12345, 2, 12000},
+                                                Row{12500, 2, 13000},
+                                                Row{12499, 2, 12000},
+                                                Row{7, 0, 10},
+                                                Row{4, 0, 0},
+                                                Row{123, 5, 123},
+                                                Row{0, 3, 0},
+                                                Row{5, 1, 5},
+                                                Row{15, 1, 20},
+                                                Row{14, 1, 10},
+                                                Row{95, 1, 100},
+                                                Row{1000000000000000000, 0, 0},
+                                                Row{999999999999999999, 0, 0},
+                                                Row{kMax, 0, 0},
+                                                Row{kMax, 1, 0},
+                                                Row{500000000000000000, 0, 1000000000000000000},
+                                                Row{999999999999999999, 18, 1000000000000000000},
+                                                Row{kMax, 4, kMax},
+                                                Row{kMax, kMax, kMax},
+                                                Row{kMax, 2, 18000000000000000000U}}) {
     EXPECT_EQ(roundSig(value, digits), expected) << value << ", " << digits;
   }
 }

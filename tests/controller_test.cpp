@@ -3,8 +3,9 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
+#include <utility>
 
-#include "ksp/connection.h"
+#include "ksp/ksp.h"
 #include "tests/scripted_platform.h"
 
 using scripted::Script;
@@ -21,17 +22,50 @@ std::string notice(const std::string& operation, const std::string& className) {
   return "notice: Fendrel: " + operation + ": Controller found: " + className + "\n";
 }
 
-TEST(ExporterTable, RowsDifferInMethodsAndMediaStatistics) {
-  EXPECT_LT(&statsSelector, &readStatsSelector);
-  EXPECT_LT(&readStatsSelector, &mspStatsSelector);
-  EXPECT_LT(&snapshotSelectors, &snapshotHeaderSelectors);
+TEST(Selectors, StandBehindTheirAccessorsInEveryRow) {
+  const struct {
+    const SelectorPair& pair;
+    uint32_t number;
+    SelectorAccessor accessor;
+    SelectorAccessor ExporterEntry::*slot;
+  } selectors[] = {
+      {statsSelector, 13, getStatsSelector, &ExporterEntry::getStatsSelector},
+      {readStatsSelector, 10, getReadStatsSelector, &ExporterEntry::getReadStatsSelector},
+      {mspStatsSelector, 221, getMspStatsSelector, &ExporterEntry::getMspStatsSelector},
+      {bandStatsSelector, 11, getBandStatsSelector, &ExporterEntry::getBandStatsSelector},
+      {defectsListSelector, 15, getDefectsListSelector, &ExporterEntry::getDefectsListSelector},
+      {telemetryListSelectors, 17, getTelemetryListSelectors, &ExporterEntry::getTelemetryListSelectors},
+      {taskSchedulerSelectors, 39, getTaskSchedulerSelectors, &ExporterEntry::getTaskSchedulerSelectors},
+      {snapshotSelectors, 22, getSnapshotSelectors, &ExporterEntry::getSnapshotSelectors},
+      {snapshotHeaderSelectors, 145, getSnapshotHeaderSelectors, &ExporterEntry::getSnapshotHeaderSelectors},
+  };
+  for (const auto& [pair, number, accessor, slot] : selectors) {
+    SCOPED_TRACE(number);
+    EXPECT_EQ(pair.word0, number);
+    EXPECT_EQ(pair.word1, number);
+    EXPECT_EQ(accessor(), &pair);
+    for (int row = 0; row < 3; ++row) {
+      const bool isEmpty = row != 0 && accessor == getMspStatsSelector;
+      EXPECT_EQ(kRows[row].*slot, isEmpty ? nullptr : accessor);
+    }
+  }
+}
+
+TEST(ExporterTable, RowsDifferInNamesMethodsAndMediaStatistics) {
+  const char* const classes[] = {kFlash, kEmbedded, "KSPStorage"};
   for (int row = 0; row < 3; ++row) {
-    EXPECT_EQ(kRows[row].getStatsSelector, getStatsSelector);
-    EXPECT_EQ(kRows[row].getTaskSchedulerSelectors()->word1, 39u);
-    EXPECT_EQ(kRows[row].getMspStatsSelector == nullptr, row != 0);
-    EXPECT_EQ(kRows[row].tunnelMethod, row == 2 ? 8u : 9u);
-    EXPECT_EQ(kRows[row].secondaryMethod, row == 2 ? 8u : 9u);
-    EXPECT_EQ(kRows[row].extraMethod, row == 2 ? 5u : 0xFFFFFFFFu);
+    const ExporterEntry& entry = kRows[row];
+    EXPECT_STREQ(entry.className, classes[row]);
+    EXPECT_STREQ(entry.propertyKey, row == 2 ? "PropertyMatch" : "Controller Characteristics");
+    EXPECT_EQ(entry.tunnelMethod, row == 2 ? 8u : 9u);
+    EXPECT_EQ(entry.secondaryMethod, row == 2 ? 8u : 9u);
+    EXPECT_EQ(entry.extraMethod, row == 2 ? 5u : 0xFFFFFFFFu);
+    EXPECT_EQ(entry.parseBuffer, KSPParseBufferToCxt);
+    EXPECT_EQ(entry.releaseContext, KSPReleaseContext);
+    EXPECT_EQ(entry.parseMspBuffer, row == 0 ? KSPMSPParseBufferToCxt : nullptr);
+    EXPECT_EQ(entry.parseFtlBuffer, KSPFTLParseBufferToCxt);
+    EXPECT_EQ(entry.parseStatKeyBuffer, KSPFTLParseStatKeyBufferToCxt);
+    EXPECT_EQ(entry.releaseGenericContext, ReleaseGenericParserCxt);
   }
   const auto* terminator = reinterpret_cast<const char*>(&kRows[3]);
   EXPECT_EQ(std::count(terminator, terminator + sizeof(ExporterEntry), 0), sizeof(ExporterEntry));
@@ -58,32 +92,44 @@ TEST(Lookup, TakesTheFirstRowThatIsPresent) {
   }
 }
 
-TEST(FindAndOpen, PassesOverControllersThatRefuse) {
-  scripted::play({.present = {kFlash, kEmbedded}, .opens = {{kFlash, kRefused}}});
-  ExporterEntry* entry = nullptr;
-  EXPECT_EQ(findNandExporterNew(&entry), 1);
-  ASSERT_EQ(entry, kRows + 1);
-  EXPECT_EQ(entry->connection, 0x50u);
-  EXPECT_EQ(entry->service, 0x102u);
-  EXPECT_EQ(kRows[0].connection, 0u);
-  EXPECT_EQ(kRows[0].service, 0u);
-  ReleaseIOInterfaces(entry);
-  ReleaseIOInterfaces(entry);
-  EXPECT_EQ(entry->connection, 0u);
-  EXPECT_EQ(entry->service, 0u);
-  EXPECT_EQ(scripted::calls(), (Calls{"open 101 type 0", "close 0", "release 101", "open 102 type 0",
-                                      notice("findNandExporterNew", kEmbedded), "close 50", "release 102"}));
-  EXPECT_EQ(scripted::unbalanced(), Calls{});
-}
-
-TEST(FindAndOpen, ClosesWhateverHandleARefusalLeft) {
-  scripted::play({.present = {kFlash}, .opens = {{kFlash, {.result = 1, .handle = 0x77}}}});
-  ExporterEntry* entry = nullptr;
-  EXPECT_EQ(findNandExporterNew(&entry), 0);
-  EXPECT_EQ(entry, kRows + 3);
-  EXPECT_EQ(entry->connection, 0u);
-  EXPECT_EQ(entry->service, 0u);
-  EXPECT_EQ(scripted::calls(), (Calls{"open 101 type 0", "close 77", "release 101"}));
+TEST(FindAndOpen, TakesTheFirstControllerThatOpens) {
+  const std::string found = notice("findNandExporterNew", kFlash);
+  const struct {
+    Script script;
+    ExporterEntry* row;
+    uint32_t connection;
+    uint32_t service;
+    Calls calls;
+  } cases[] = {
+      {{}, kRows + 3, 0, 0, {}},
+      {{.present = {kFlash, kEmbedded}, .opens = {{kFlash, kRefused}}},
+       kRows + 1,
+       0x50,
+       0x102,
+       {"open 101 type 0", "close 0", "release 101", "open 102 type 0",
+        notice("findNandExporterNew", kEmbedded), "close 50", "release 102"}},
+      {{.present = {kFlash}, .opens = {{kFlash, {.result = 1, .handle = 0x77}}}},
+       kRows + 3,
+       0,
+       0,
+       {"open 101 type 0", "close 77", "release 101"}},
+      {{.present = {kFlash}, .opens = {{kFlash, {.handle = 0}}}},
+       kRows,
+       0,
+       0x101,
+       {"open 101 type 0", found, "release 101"}},
+  };
+  for (const auto& [script, row, connection, service, calls] : cases) {
+    scripted::play(script);
+    ExporterEntry* entry = nullptr;
+    EXPECT_EQ(findNandExporterNew(&entry), service != 0 ? 1 : 0);
+    ASSERT_EQ(entry, row);
+    EXPECT_EQ(entry->connection, connection);
+    EXPECT_EQ(entry->service, service);
+    for (int again = 0; again < 2; ++again) ReleaseIOInterfaces(entry);
+    for (const ExporterEntry& each : nand_exporters_tunnel) EXPECT_EQ(each.connection + each.service, 0u);
+    EXPECT_EQ(scripted::calls(), calls);
+  }
 }
 
 TEST(Connection, OpensThroughASecondLookupAndCloses) {
@@ -105,33 +151,36 @@ TEST(Connection, OpensThroughASecondLookupAndCloses) {
   EXPECT_EQ(scripted::unbalanced(), Calls{});
 }
 
-TEST(Connection, FailuresSayWhyAndLeaveNothing) {
+TEST(Connection, JudgesByHandleAndAccessorAndSaysWhatFails) {
   const std::string cannot = "Can't get KSP Connection!\n";
   const std::string failed = "OpenServiceConnection failed for class 'VantorFlash3NVMeController', result 0x";
   const struct {
     Script script;
     ExporterEntry* row;
     std::string message;
+    int result = 0;
     SelectorAccessor stats = getStatsSelector;
   } cases[] = {
       {{}, kRows + 3, "Can't get KSP Connection, no matching service!\n"},
       {{.present = {kFlash}, .missingLookups = {2}}, kRows + 3, "No class found" + cannot},
       {{.present = {kFlash}, .opens = {{kFlash, kRefused}}}, kRows, failed + "e00002c5\n" + cannot},
       {{.present = {kFlash}, .opens = {{kFlash, {.handle = 0}}}}, kRows, cannot},
-      {{.present = {kFlash}}, kRows, cannot, getReadStatsSelector},
+      {{.present = {kFlash}}, kRows, cannot, 0, getReadStatsSelector},
+      {{.present = {kFlash}, .opens = {{kFlash, {.result = 0x2C5}}}}, kRows, failed + "2c5\n", 1},
   };
-  for (const auto& [script, row, message, stats] : cases) {
+  for (const auto& [script, row, message, result, stats] : cases) {
     scripted::play(script);
     kRows[0].getStatsSelector = stats;
     KSPConnection connection = {7, 7, nullptr};
     testing::internal::CaptureStderr();
-    EXPECT_EQ(openKSPConnection(&connection), 0);
+    EXPECT_EQ(openKSPConnection(&connection), result);
     EXPECT_EQ(testing::internal::GetCapturedStderr(), message);
     kRows[0].getStatsSelector = getStatsSelector;
     kRows[0].connection = 0;
-    EXPECT_EQ(connection.service, 0u);
-    EXPECT_EQ(connection.connection, 0u);
+    EXPECT_EQ(connection.service, result == 0 ? 0u : 0x101u);
+    EXPECT_EQ(connection.connection, result == 0 ? 0u : 0x50u);
     EXPECT_EQ(connection.exporter, row);
+    closeKSPConnection(&connection);
     EXPECT_EQ(scripted::unbalanced(), Calls{});
   }
 }

@@ -89,8 +89,11 @@ std::vector<Case> cases() {
   const std::set<std::string> flash = {kFlash};
   std::vector<Case> all = {
       {"CheckIn", {.state = 0, .present = flash}, {"state?"}},
+      {"State1", {.state = 1, .present = flash}, {"state?"}},
+      {"Deferred", {.state = 3, .present = flash}, {"state?"}},
       {"NoController", {}, kStart + kStop},
       {"OpenFails", {.present = flash, .opens = {{kFlash, {.result = -1, .setsHandle = false}}}}, kOpenFails},
+      {"OpenFailsAndLeavesAHandle", {.present = flash, .opens = {{kFlash, {.result = -1}}}}, kOpenFails},
       {"ZeroHandle", {.present = flash, .opens = {{kFlash, {.handle = 0}}}}, kOpenFails},
       {"DoneAtOnce",
        {.present = flash, .steps = {{0, 0}}},

@@ -3,6 +3,7 @@
 #include <endian.h>
 
 #include <algorithm>
+#include <cstddef>
 #include <cstdint>
 #include <cstdio>
 #include <cstring>
@@ -86,32 +87,19 @@ inline constexpr auto plainStatKey = [](auto&, const unsigned char* stream, uint
   return plainStatistics(stream, length, true, append);
 };
 
+/// Keys of the summary's fields, and where these lie behind its first: four bytes in front of the 32nd, then
+/// eight.
+inline constexpr std::pair<uint64_t, size_t> kPlainSummary[] = {
+    {53, 0},  {52, 12}, {51, 16}, {50, 20},  {49, 24},  {7, 32},   {4, 40},   {48, 48}, {17, 56},
+    {19, 64}, {18, 72}, {20, 80}, {12, 112}, {13, 120}, {56, 128}, {28, 136}, {45, 144}};
+
 inline void plainSummary(KSPParseContext& context, uint64_t key, const unsigned char* values, size_t count) {
-  using Context = KSPParseContext;
-  static constexpr std::pair<uint64_t, uint64_t Context::*> kWhole[] = {
-      {4, &Context::hostWrites},
-      {7, &Context::hostReads},
-      {12, &Context::IND_pool_free},
-      {13, &Context::IND_pool_count},
-      {17, &Context::wearLevMoves},
-      {18, &Context::nandWrites},
-      {19, &Context::nandReads},
-      {20, &Context::bandErases},
-      {28, &Context::numSleepOps},
-      {45, &Context::maxHighEnduranceBlockErases},
-      {48, &Context::numFreeVirtualBlocks},
-      {56, &Context::utilFormatTime},
-  };
-  static constexpr std::pair<uint64_t, uint32_t Context::*> kLow[] = {
-      {49, &Context::bytesPerPage},          {50, &Context::pagesPerVirtualBlock},
-      {51, &Context::blocksPerVirtualBlock}, {52, &Context::numVirtualBlocks},
-      {53, &Context::exportVersion},
-  };
-  for (const auto& [from, field] : kWhole) {
-    if (from == key) context.*field = plainNumber(values, 8);
-  }
-  for (const auto& [from, field] : kLow) {
-    if (from == key) context.*field = static_cast<uint32_t>(plainNumber(values, 4));
+  const uint64_t value = plainNumber(values, 8);
+  const auto low = static_cast<uint32_t>(value);
+  for (const auto& [of, offset] : kPlainSummary) {
+    char* const field = reinterpret_cast<char*>(&context) + offsetof(KSPParseContext, exportVersion) + offset;
+    if (of == key && offset < 32) std::memcpy(field, &low, sizeof low);
+    if (of == key && offset >= 32) std::memcpy(field, &value, sizeof value);
   }
   for (size_t i = 0; key == 265 && i < std::min<size_t>(count, 5); ++i) {
     context.readCountHisto[i] = plainNumber(values + 8 * i, 8);

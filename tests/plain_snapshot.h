@@ -15,34 +15,8 @@
 namespace ksp::test {
 
 inline constexpr char kPlainLegend[] =
-    "Key: \n"
-    R"(T   - Timestamp
-E   - Erased bands during this time interval
-HR  - Host Reads (in 4k sectors)
-HW  - Host Writes (in 4k sectors)
-NR  - Nand Reads (in 4k sectors)
-NW  - Nand Writes (in 4k sectors)
-TH  - Time in Hysteresis in this time interval (in ms)
-GC  - Number of sectors (4k bytes) completed GC in this time interval
-W   - Number of wear level bands completed in this time interval
-BI  - Bands Intermediate (SLC) PendingErase
-BU  - Bands User (MLC) PendingErase
-V   - Number of Free Nodes
-BF  - Buffer Fragments/BufferHighWater
-P   - Percent of time in DoPreempt rather than DoNormal
-H   - Qos Delays: Normal/Extreme
-X   - Successful expedite commands/Failed expedite commands
-L   - Age of the oldest command in ms (calculated every second)/Qos Interval (in 100us units)
-C   - Command tags in use by host (Min/Max)S   - Number of free segs
-U   - Sectors of host unmaps
-RO  - Num read ops for this time interval: priority0/priority1/...
-RL  - Total Read Latency (in us) for this time interval: priority0/priority1/...
-RM  - Max Read Latency (int us) for this time interval: priority0/priority1/...
-WO  - Num write ops for this time interval: priority0/priority1/...
-WL  - Total write latency (in us) for this time interval: priority0/priority1/...
-WM  - Max write latency (in us) for this time interval: priority0/priority1/...
-
-)";
+#include "tests/data/legend.inc"
+    ;
 
 #pragma GCC diagnostic push
 #pragma GCC diagnostic ignored "-Wformat-nonliteral"
