@@ -45,12 +45,13 @@ std::string words(const std::vector<uint32_t>& values) {
 }
 
 // A header whose records begin with the only field that is printed, a plain number: the next one is of no
-// known type, and the last one lies outside.
+// known type, and the last two lie outside.
 std::string makeHeader(uint32_t recordSize, uint32_t recordCount) {
   const std::string title("%u #3%%\0", 8);
   const std::string number("%u\0\0\0\0\0\0\0\0\0\0\0\0\0\0", 16);
-  return words({0, 0x80000006, recordSize, recordCount, 0, 0, 44, 0, 0}) + title + words({3, 0, 0, 0, 4}) +
-         number + words({0x100, 0, 4}) + number + words({0, 0x10000, 4}) + number;
+  return words({0, 0x80000006, recordSize, recordCount, 0, 0, 44, 0, 0}) + title + words({4, 0, 0, 0, 4}) +
+         number + words({0x100, 0, 4}) + number + words({0, 0x10000, 4}) + number + words({3, 0, 0x10000}) +
+         std::string("%s").append(14, '\0');
 }
 
 struct Outcome {
