@@ -24,8 +24,9 @@ extern "C" void* malloc(size_t size) {
 }
 #endif
 
+static suseconds_t microseconds = 7999;
 extern "C" int __wrap_gettimeofday(timeval* now, void* /*zone*/) {
-  *now = {.tv_sec = 1772317805, .tv_usec = 7999};
+  *now = {.tv_sec = 1772317805, .tv_usec = microseconds};
   return 0;
 }
 
@@ -33,6 +34,8 @@ namespace ksp::test {
 namespace {
 
 constexpr std::string_view kCaptureLine = "Captured at: 2026-02-28 22:30:05.007\n";
+// Without a zone the C library copies its default one's name at each look.
+const bool kZoneIsSet = setenv("TZ", "UTC0", 1) == 0 && (tzset(), true);
 constexpr char kUntouched = '\x5A';
 const std::string kHeading = "- KSP Snapshot - \n%u #3%%\n";
 
@@ -117,8 +120,7 @@ std::string read(const std::filesystem::path& file) {
 
 // NAME.txt is what NAME.records show, and with a NAME.header the page that they make, below its first line.
 TEST(Snapshot, RendersEachCaptureWithoutAllocating) {
-  setenv("TZ", "UTC0", 1);  // without it the C library copies its default zone's name at each look
-  tzset();
+  ASSERT_TRUE(kZoneIsSet);
   size_t captures = 0;
   for (const auto& entry : std::filesystem::recursive_directory_iterator(KSP_TEST_DATA "/snapshot")) {
     std::filesystem::path file = entry.path();
@@ -149,24 +151,26 @@ TEST(Snapshot, RendersEachCaptureWithoutAllocating) {
 }
 
 TEST(Snapshot, PageShowsTheLocalTimeOfItsRendering) {
-  for (const auto& [zone, local] :
-       {std::pair{"AAA-5:30", "2026-03-01 04:00:05"}, {"BBB+11", "2026-02-28 11:30:05"}}) {
+  const std::string header = makeHeader(4, 2);
+  const std::string records = words({1, 1});
+  for (const auto& [zone, fraction, local] : {std::tuple{"AAA-5:30", 500499, "2026-03-01 04:00:05.500"},
+                                              {"BBB+11", 999, "2026-02-28 11:30:05.000"}}) {
     setenv("TZ", zone, 1);
-    const std::string header = makeHeader(4, 2);
+    microseconds = fraction;
     std::string out(200, kUntouched);
     uint64_t size = out.size();
     uint32_t cursor = 0;
-    KSPParseSnapshotBufferWithInplaceParser(words({1, 1}).data(), 8, out.data(), &size, header.data(),
-                                            &cursor);
-    EXPECT_EQ(out.substr(0, kCaptureLine.size()), std::string("Captured at: ") + local + ".007\n");
+    KSPParseSnapshotBufferWithInplaceParser(records.data(), 8, out.data(), &size, header.data(), &cursor);
+    EXPECT_EQ(out.substr(0, kCaptureLine.size()), std::string("Captured at: ") + local + "\n");
   }
+  setenv("TZ", "UTC0", 1);
+  microseconds = 7999;
 }
 
 // Taking the cursor back for the line that did not fit, a caller gets every record once.
 TEST(Snapshot, PagesOfAnyCapacityHoldEveryRecord) {
   const std::string records = words({1, 22, 333, 0, 4444, 55555, 0, 0, 666666, 7777777, 8, 9});
   const std::string header = makeHeader(4, 12);
-  setenv("TZ", "UTC0", 1);
   for (uint64_t capacity = 0; capacity < 140; ++capacity) {
     std::string paged;
     uint32_t start = 0;
