@@ -58,13 +58,13 @@ TEST(Context, RefusedAppendsLeaveItAsItWas) {
   GenericContext context;
   const unsigned char source[32] = {};
   EXPECT_EQ(AddMultipleFieldsToGenericContext(context.get(), "n", source, 9, 1), 0);
-  EXPECT_EQ(AddMultipleFieldsToGenericContext(context.get(), "n", source, 9, 3), 0);
-  EXPECT_EQ(AddMultipleFieldsToGenericContext(context.get(), "n", source, 1, 65536), 0);
-  EXPECT_EQ(AddMultipleFieldsToGenericContext(context.get(), "n", nullptr, 4, 0), 1);
-  EXPECT_EQ(AddMultipleFieldsToGenericContext(nullptr, "n", source, 1, 2), 0);
-  EXPECT_EQ(AddSingleValueToGenericContext(nullptr, "", "n", 1), 0);
-  EXPECT_EQ(AddMultipleFieldsToGenericContext(nullptr, "n", nullptr, 9, 0), 1);
-  EXPECT_EQ(AddMultipleFieldsToGenericContext(nullptr, "n", nullptr, 0, 70000), 1);
+  EXPECT_EQ(AddMultipleFieldsToGenericContext(context.get(), nullptr, source, 9, 3), 0);
+  EXPECT_EQ(AddMultipleFieldsToGenericContext(context.get(), nullptr, source, 1, 65536), 0);
+  EXPECT_EQ(AddMultipleFieldsToGenericContext(context.get(), nullptr, nullptr, 4, 0), 1);
+  EXPECT_EQ(AddMultipleFieldsToGenericContext(nullptr, nullptr, source, 1, 2), 0);
+  EXPECT_EQ(AddSingleValueToGenericContext(nullptr, nullptr, nullptr, 1), 0);
+  EXPECT_EQ(AddMultipleFieldsToGenericContext(nullptr, nullptr, nullptr, 9, 0), 1);
+  EXPECT_EQ(AddMultipleFieldsToGenericContext(nullptr, nullptr, nullptr, 0, 70000), 1);
   EXPECT_TRUE(entries(context).empty());
   EXPECT_EQ(context->nameTail, nullptr);
 }
