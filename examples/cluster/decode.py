@@ -20,6 +20,7 @@ import contextlib
 import fcntl
 import gzip
 import hashlib
+import itertools
 import json
 import logging
 import os
@@ -35,7 +36,7 @@ import distributed
 import tqdm
 
 PART_CAPTURES = 200
-PART_BYTES = 64 << 20
+PART_BYTES = 16 << 20
 PARTS_IN_FLIGHT = 1000
 COMPRESSION = 1  # the table is 15 % larger than with the usual 6, in a third of the time
 CLEAN, FINDINGS, USAGE, UNREADABLE, INCOMPLETE = range(5)
@@ -50,7 +51,7 @@ class Failure(Exception):
 
 
 class Crash(Exception):
-    """kspdump ended otherwise than by an exit status of its own."""
+    """kspdump did not end by itself; the fault may be a capture's."""
 
 
 # What workers do. Dask sends these functions to them by value, so they need no copy of this program.
@@ -88,59 +89,105 @@ def digest(line):
     return source, document if document["findings"] else None
 
 
-def run_kspdump(kspdump, kind, paths, file):
-    """Appends the captures' documents to a file, compressed. Returns the sources and the documents with
-    findings, without their records; and what kspdump says of those that it cannot read."""
-    begin = file.tell()
-    sources, findings = [], []
-    command = [kspdump, kind, "--jobs", "1", "--format", "json", *paths]
+def run_kspdump(command, take):
+    """Hands each line that kspdump prints to `take`. Returns why what cannot be read cannot be, by source."""
     with tempfile.TemporaryFile() as complaints:
-        with subprocess.Popen(command, stdout=subprocess.PIPE, stderr=complaints) as program:
-            with gzip.GzipFile("", "wb", COMPRESSION, file, mtime=0) as packed:
-                for line in program.stdout:
-                    if not line.endswith(b"\n"):
-                        break
-                    packed.write(line)
-                    source, finding = digest(line)
-                    sources.append(source)
-                    if finding:
-                        findings.append(finding)
+        with subprocess.Popen(command, stdin=subprocess.DEVNULL, stdout=subprocess.PIPE, stderr=complaints) as program:
+            for line in program.stdout:
+                take(line)
         complaints.seek(0)
         said = complaints.read().decode("utf-8", "backslashreplace")
+    if program.returncode < 0:
+        raise Crash(f"kspdump was ended by signal {-program.returncode}")
     if program.returncode not in (CLEAN, FINDINGS, UNREADABLE):
+        raise RuntimeError(f"{command[:2]} ended with {program.returncode}: {said.strip()[:200]}")
+    return dict(re.findall(r"^kspdump: (.*): cannot be read: (.*)$", said, re.MULTILINE))
+
+
+def owner(source, inputs):
+    """Whose capture it is: an archive's own name stands before its members'."""
+    for name in itertools.accumulate(source.split("/"), "{}/{}".format):
+        if name in inputs:
+            return name
+    return None
+
+
+def decode_batch(inputs, kind, kspdump, file, tally):
+    """Appends the documents of some inputs to a file and its tally. Returns why inputs cannot be read."""
+    inputs = {spelled(path): (path, *rest) for path, *rest in inputs}
+    held = {source: collections.Counter() for source in inputs}
+
+    def identify(line):
+        document = json.loads(line)
+        source = owner(document["source"], inputs)
+        if source is None:
+            raise ValueError(f"kspdump identifies {document['source']}, which nobody asked for")
+        # What is named is decoded, whatever it looks like; what is found is decoded if it is of the kind.
+        is_named = source == document["source"] and not inputs[source][-1]
+        held[source][kind if is_named else document["kind"]] += 1
+
+    run_kspdump([kspdump, "identify", "--format", "json", *(path for path, *_ in inputs.values())], identify)
+    delivered, findings = collections.Counter(), []
+
+    def deliver(line):
+        packed.write(line)
+        source, finding = digest(line)
+        delivered[owner(source, inputs)] += 1
+        if finding:
+            findings.append(finding)
+
+    wanted = [inputs[source][0] for source, kinds in held.items() if kinds[kind] or not kinds]
+    begin = file.tell()
+    try:
+        with gzip.GzipFile("", "wb", COMPRESSION, file, mtime=0) as packed:
+            command = [kspdump, kind, "--jobs", "1", "--format", "json", *wanted]
+            reasons = run_kspdump(command, deliver) if wanted else {}
+    except Crash:
         file.seek(begin)
         file.truncate()
-        raise Crash(f"{kspdump} ended with {program.returncode}: {said.strip()[-200:]}")
-    return sources, findings, dict(re.findall(r"^kspdump: (.*): cannot be read: (.*)$", said, re.MULTILINE))
+        raise
+    for source, kinds in held.items():
+        if kinds[kind] != delivered[source]:
+            raise ValueError(f"{source}: {kinds[kind]} captures in, {delivered[source]} documents out")
+    tally["documents"] += delivered.total()
+    tally["inputs"] += [[*inputs[source], kinds[kind]] for source, kinds in held.items() if kinds]
+    tally["findings"] += findings
+    unreadable, nameless = {}, []
+    for source, reason in reasons.items():
+        where = owner(source, inputs)
+        if where is None:
+            nameless.append(reason)
+        elif held[where]:
+            tally["findings"].append({"source": source, "kind": kind, "unreadable": reason})
+        else:
+            unreadable[inputs[where][0]] = reason if source == where else f"{source}: {reason}"
+    # A name with control characters is spelled otherwise in a message; messages keep the order of inputs.
+    silent = [path for source, (path, *_) in inputs.items() if not held[source] and path not in unreadable]
+    unreadable.update(zip(silent, nameless))
+    return unreadable
 
 
 def decode_part(name, inputs, kind, folder, kspdump):
-    """Makes one file of the table from some captures: inputs of path, bytes and time of change. Returns why
-    some cannot be read, by path, and the file's tally, which also stands beside the table."""
-    folder = pathlib.Path(folder)
-    unreadable, delivered, findings, documents = {}, [], [], 0
-    with whole_file(folder / f"{name}.jsonl.gz") as file:
-        batches = [inputs]
-        while batches:
-            batch = batches.pop(0)
-            try:
-                sources, wrong, reasons = run_kspdump(kspdump, kind, [each[0] for each in batch], file)
-            except Crash as crash:
-                if len(batch) == 1:
-                    unreadable[batch[0][0]] = str(crash)
-                batches += [[each] for each in batch] if len(batch) > 1 else []
-                continue
-            documents += len(sources)
-            findings += wrong
-            count = collections.Counter(sources)
-            delivered += [[*each, count[spelled(each[0])]] for each in batch if count[spelled(each[0])]]
-            silent = [each[0] for each in batch if not count[spelled(each[0])]]
-            if len(silent) == len(reasons):
-                unreadable |= {path: reasons.get(spelled(path), "kspdump cannot read it") for path in silent}
-        tally = {"kind": kind, "documents": documents, "bytes": file.tell(), "inputs": delivered,
-                 "findings": findings}
-        with whole_file(folder / "_parts" / f"{name}.json") as record:
-            record.write(json.dumps(tally).encode())
+    """Makes one file of the table from some inputs: path, bytes, time of change and whether it was found in a
+    folder. Returns the file's tally, which also stands beside the table, and why inputs cannot be read."""
+    part, record = pathlib.Path(folder, f"{name}.jsonl.gz"), pathlib.Path(folder, "_parts", f"{name}.json")
+    unreadable = {}
+    tally = {"kind": kind, "documents": 0, "inputs": [], "findings": []}
+    with whole_file(part) as file:
+        try:
+            unreadable |= decode_batch(inputs, kind, kspdump, file, tally)
+        except Crash:
+            for each in inputs:
+                try:
+                    unreadable |= decode_batch([each], kind, kspdump, file, tally)
+                except Crash as crash:
+                    unreadable[each[0]] = str(crash)
+        tally["bytes"] = file.tell()
+        with whole_file(record) as tallied:
+            tallied.write(json.dumps(tally).encode())
+    if not tally["documents"]:
+        part.unlink()
+        record.unlink()
     return tally, unreadable
 
 
@@ -158,10 +205,11 @@ def examine_worker(kspdump, folder, run):
 # What this machine does.
 
 
-def list_captures(sources, lists, table):
-    """All files that are named or stand below the folders that are named, but not below the table's, with size
-    and time of change; and what cannot be read."""
-    paths, unreadable = set(), {}
+def list_inputs(sources, lists, table):
+    """All files that are named, or stand below the folders that are named but not below the table's: path,
+    bytes, time of change and whether it was found in a folder. Then why others cannot be read, and how many
+    are no files at all."""
+    found, unreadable, others = {}, {}, 0
     for path in lists:
         try:
             with open(path, "rb") if path != "-" else contextlib.nullcontext(sys.stdin.buffer) as names:
@@ -170,23 +218,26 @@ def list_captures(sources, lists, table):
             raise Failure(f"{path}: {error.strerror}", USAGE) from error
     for source in map(os.path.abspath, sources):
         if not os.path.isdir(source):
-            paths.add(source)
+            found[source] = False
             continue
         for folder, folders, files in os.walk(source, onerror=lambda e: unreadable.update({e.filename: e.strerror})):
             folders[:] = [each for each in folders if os.path.join(folder, each) != table]
-            paths.update(os.path.join(folder, file) for file in files)
+            for path in (os.path.join(folder, file) for file in files):
+                found.setdefault(path, True)
     inputs = []
-    for path in sorted(paths):
+    for path, is_found in sorted(found.items()):
         try:
-            status = os.stat(path)
+            status = os.lstat(path) if is_found else os.stat(path)
         except OSError as error:
             unreadable[path] = error.strerror
             continue
         if stat.S_ISREG(status.st_mode):
-            inputs.append((path, status.st_size, status.st_mtime_ns))
+            inputs.append((path, status.st_size, status.st_mtime_ns, is_found))
+        elif is_found:
+            others += 1
         else:
             unreadable[path] = "no regular file"
-    return inputs, unreadable
+    return inputs, unreadable, others
 
 
 class Table:
@@ -210,49 +261,56 @@ class Table:
     def read(self, inputs):
         """Reads the tallies of the parts that are there. A part goes, and what it held counts as missing, if
         a capture has changed since, or stands in another part too."""
-        now = {path: [size, changed] for path, size, changed in inputs}
+        now = {path: [size, changed] for path, size, changed, _ in inputs}
         seen = set()
         self.sweep()
         for part in sorted(self.folder.glob("*.jsonl.gz")):
             name = part.name.removesuffix(".jsonl.gz")
+            record = self.folder / "_parts" / f"{name}.json"
             try:
-                tally = json.loads((self.folder / "_parts" / f"{name}.json").read_bytes())
-                whole = part.stat().st_size == tally["bytes"]
+                tally = json.loads(record.read_bytes())
+                is_whole = part.stat().st_size == tally["bytes"]
             except (OSError, ValueError) as error:
                 raise Failure(f"{part}: not a part of this table, its tally cannot be read: {error}") from error
             if tally["kind"] != self.kind:
                 raise Failure(f"{self.folder} holds {tally['kind']}; give {self.kind} a folder of its own", USAGE)
-            paths = {path for path, *_ in tally["inputs"]}
-            changed = any(now.get(path, state) != state for path, *state, _ in tally["inputs"])
-            if whole and not changed and not paths & seen:
+            paths = {path for path, *_, captures in tally["inputs"] if captures}
+            has_changed = any(now.get(path, state) != state for path, *state, _, _ in tally["inputs"])
+            if is_whole and not has_changed and not paths & seen:
                 self.tallies[name] = tally
                 seen |= paths
             else:
                 part.unlink()
-                (self.folder / "_parts" / f"{name}.json").unlink()
+                record.unlink()
 
     def sweep(self):
         """Removes what workers that died have left unfinished."""
-        for left in self.folder.rglob(".unfinished-*"):
-            left.unlink(missing_ok=True)
+        for folder in (self.folder, self.folder / "_parts"):
+            for left in folder.glob(".unfinished-*"):
+                left.unlink(missing_ok=True)
 
-    def missing(self, inputs):
-        done = {path for tally in self.tallies.values() for path, *_ in tally["inputs"]}
-        return [each for each in inputs if each[0] not in done]
+    def captures(self):
+        """How many captures each input held; none where it was passed over."""
+        held = {}
+        for tally in self.tallies.values():
+            for path, *_, captures in tally["inputs"]:
+                held[path] = max(captures, held.get(path, 0))
+        return held
 
     def lacking(self):
-        """Parts that workers say they have written, but that are not here."""
+        """Parts that workers say they have written, but that are not here like that or do not add up."""
         sizes = {entry.name: entry.stat().st_size for entry in os.scandir(self.folder)}
-        return [name for name, tally in self.tallies.items() if sizes.get(f"{name}.jsonl.gz") != tally["bytes"]]
+        return [name for name, tally in self.tallies.items()
+                if tally["documents"] and sizes.get(f"{name}.jsonl.gz") != tally["bytes"]
+                or tally["documents"] != sum(captures for *_, captures in tally["inputs"])]
 
     def write_findings(self, unreadable):
-        lines = [(each["source"], each) for tally in self.tallies.values() for each in tally["findings"]]
-        lines += [(path, {"source": spelled(path), "kind": self.kind, "unreadable": reason})
-                  for path, reason in unreadable.items()]
+        lines = [each for tally in self.tallies.values() for each in tally["findings"]]
+        lines += [{"source": spelled(path), "kind": self.kind, "unreadable": unreadable[path]} for path in unreadable]
         with whole_file(self.folder / "findings.jsonl") as file:
-            for _, line in sorted(lines, key=lambda each: each[0]):
+            for line in sorted(lines, key=lambda each: each["source"]):
                 file.write(json.dumps(line, separators=(",", ":")).encode() + b"\n")
-        return len(lines) - len(unreadable)
+        return lines
 
 
 def split(inputs, kind):
@@ -317,53 +375,60 @@ def work(client, parts, arguments, table, progress):
             table.tallies[name] = tally
             unreadable |= reasons
         else:
-            wrong.append(f"{name}, {len(inputs)} captures from {inputs[0][0]} on: {future.exception()!r}")
+            wrong.append(f"{name}, {len(inputs)} files from {inputs[0][0]} on: {future.exception()!r}")
     wrong.append("no worker is left" if idle > arguments.patience else "the scheduler is gone")
     return unreadable, wrong
 
 
 def decode(arguments):
     table = Table(pathlib.Path(arguments.into), arguments.kind)
-    inputs, unreadable = list_captures(arguments.sources, arguments.files0_from, str(table.folder))
-    asked = unreadable.keys() | {path for path, *_ in inputs}
+    inputs, unreadable, others = list_inputs(arguments.sources, arguments.files0_from, arguments.into)
     table.read(inputs)
-    missing = table.missing(inputs)
+    before = table.captures()
+    # What was passed over when it was found in a folder is wanted when it is named.
+    missing = [each for each in inputs if each[0] not in before or not (before[each[0]] or each[-1])]
     wrong = []
     if missing:
         with connect(arguments.scheduler, arguments.kspdump, table) as client:
-            with tqdm.tqdm(total=len(missing), unit=" captures", disable=None) as progress:
+            with tqdm.tqdm(total=len(missing), unit=" files", disable=None) as progress:
                 reasons, wrong = work(client, split(missing, arguments.kind), arguments, table, progress)
         unreadable |= reasons
-    return report(table, asked, len(inputs) - len(missing), unreadable, wrong)
+    return report(table, inputs, others, len(missing), unreadable, wrong)
 
 
-def report(table, asked, before, unreadable, wrong):
+def report(table, inputs, others, tried, unreadable, wrong):
     """Says what was done and whether it adds up; returns the exit status."""
     table.sweep()
     for name in table.lacking():
         wrong.append(f"{name}.jsonl.gz is not here as a worker wrote it")
         del table.tallies[name]
-    here = {path for tally in table.tallies.values() for path, *_ in tally["inputs"]}
-    unreadable = {path: reason for path, reason in unreadable.items() if path not in here}
-    damaged = table.write_findings(unreadable)
-    documents = len(asked & here)
-    print(f"captures in    {len(asked)}, {before} of them decoded before")
+    held = table.captures()
+    unreadable = {path: reason for path, reason in unreadable.items() if not held.get(path)}
+    asked = unreadable.keys() | {path for path, *_ in inputs}
+    names = set(map(spelled, asked))
+    findings = [line for line in table.write_findings(unreadable) if owner(line["source"], names)]
+    lost = sum("unreadable" in line for line in findings)
+    documents = sum(held.get(path, 0) for path in asked)
+    passed_over = others + sum(held.get(path) == 0 for path in asked)
+    missing = sum(path not in held and path not in unreadable for path in asked)
+    before = len(inputs) - tried
+    print(f"files          {len(asked) + others}, {before} of them done before, {passed_over} without {table.kind}")
+    print(f"captures in    {documents + lost + missing}")
     print(f"documents out  {documents}, in {table.folder}")
-    print(f"with findings  {damaged}, in {table.folder / 'findings.jsonl'}")
-    print(f"unreadable     {len(unreadable)}, likewise")
+    print(f"unreadable     {lost}, in {table.folder / 'findings.jsonl'}")
+    print(f"with findings  {len(findings) - lost}, likewise")
     for line in wrong[:10]:
         print(f"decode.py: {line}", file=sys.stderr)
-    missing = len(asked) - documents - len(unreadable)
     if missing or wrong:
-        print(f"decode.py: {missing} captures are missing; start it again", file=sys.stderr)
+        print(f"decode.py: {missing} files are missing from the table; start it again", file=sys.stderr)
         return INCOMPLETE
-    return UNREADABLE if unreadable else FINDINGS if damaged else CLEAN
+    return UNREADABLE if lost else FINDINGS if findings else CLEAN
 
 
 def main():
     parser = argparse.ArgumentParser(description=__doc__, formatter_class=argparse.RawDescriptionHelpFormatter)
     parser.add_argument("scheduler", metavar="SCHEDULER", help="address, as tcp://HOST:8786, or scheduler file")
-    parser.add_argument("sources", metavar="SOURCE", nargs="*", help="capture, or folder of captures")
+    parser.add_argument("sources", metavar="SOURCE", nargs="*", help="capture, archive, or folder of either")
     parser.add_argument("--into", metavar="FOLDER", required=True, type=os.path.abspath, help="where the table is")
     parser.add_argument("--kind", required=True, choices=["stats", "media"])
     parser.add_argument("--files0-from", metavar="LIST", action="append", default=[],

@@ -80,4 +80,5 @@ def moved(frame, old, new):
     days = [frame[frame["day"] == day].groupby(["unit", "key", "element"])["value"].last() for day in (old, new)]
     both = pandas.concat(days, axis=1, keys=["old", "new"], join="inner").reset_index()
     both["delta"] = [int(b) - int(a) for a, b in zip(both["old"], both["new"])]
-    return both.sort_values("delta", key=lambda delta: delta.map(abs), ascending=False, kind="stable", ignore_index=True)
+    farthest = both["delta"].map(abs).sort_values(ascending=False, kind="stable")
+    return both.loc[farthest.index].reset_index(drop=True)

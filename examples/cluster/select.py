@@ -35,9 +35,10 @@ def pattern(text):
     return text
 
 
-def cluster(scheduler):
+def cluster(scheduler, files):
     if scheduler is None:
-        return dask.config.set(scheduler="processes")
+        # A few files are read before other processes have started.
+        return dask.config.set(scheduler="processes" if files > 4 else "sync")
     import distributed  # takes long to load
 
     return distributed.Client(scheduler, timeout=10)
@@ -58,10 +59,11 @@ def main():
     arguments = parser.parse_args()
     signal.signal(signal.SIGPIPE, signal.SIG_DFL)
     folder = arguments.folder.absolute()
-    if not any(folder.rglob("*.jsonl.gz")):
+    files = sum(1 for _ in folder.rglob("*.jsonl.gz"))
+    if not files:
         complain(f"{folder}: no table of decode.py", 2)
     try:
-        with cluster(arguments.scheduler):
+        with cluster(arguments.scheduler, files):
             frame = fleet_table.statistic(folder, arguments.name, arguments.pattern)
     except (OSError, ValueError) as error:
         complain(error, 3)

@@ -1,5 +1,5 @@
 #!/usr/bin/python3
-"""cluster_test.py KSPDUMP CAPTURE_GENERATOR EXAMPLES: the programs on a real scheduler and two workers."""
+"""cluster_test.py KSPDUMP CAPTURE_GENERATOR CAPTURES PROGRAMS: the programs on a real scheduler and two workers."""
 
 import csv
 import glob
@@ -7,6 +7,7 @@ import gzip
 import json
 import os
 import pathlib
+import shutil
 import signal
 import struct
 import subprocess
@@ -15,22 +16,10 @@ import tempfile
 import time
 import unittest
 
-DEADLINE = 60
-CAPTURES = 5000
-CUT = [7, 2500, 4999]
-
-
-def wait_for(condition, what):
-    end = time.monotonic() + DEADLINE
-    while not condition():
-        if time.monotonic() > end:
-            raise TimeoutError(what)
-        time.sleep(0.01)
-
-
-def stats(**values):
-    keys = {"hostWrites": 4, "bandErases": 20}
-    return b"".join(struct.pack("<IIQ", keys[name], 1, value) for name, value in values.items())
+DEADLINE = 120
+COUNT = 5000
+BUNDLED = 300  # of them in an archive
+CUT = [2000, 3500, 4999]
 
 
 class ClusterTest(unittest.TestCase):
@@ -42,120 +31,115 @@ class ClusterTest(unittest.TestCase):
         cls.scheduler = cls.folder / "scheduler.json"
         cls.started = []
         cls.addClassCleanup(lambda: [process.kill() or process.wait() for process in cls.started])
-        cls.start("scheduler", "--host", "127.0.0.1", "--port", "0")
-        cls.workers = [cls.start_worker() for _ in range(2)]
-        cls.fleet = cls.folder / "fleet"
-        cls.fleet.mkdir()
-        subprocess.run([GENERATOR, cls.fleet, "--fleet", str(CAPTURES)], check=True)
-        for unit in CUT:
-            os.truncate(cls.fleet / f"unit-{100000 + unit}.stats", 20004)
-        cls.unreadable = cls.fleet / "unit-099999.stats"
-        cls.unreadable.symlink_to("nowhere")
+        cls.start("scheduler", "--port", "0")
+        cls.workers = [cls.start("worker", "--nthreads", "1", "--no-nanny") for _ in range(2)]
 
     @classmethod
     def start(cls, program, *options):
-        log = open(cls.folder / f"{program}-{len(cls.started)}.log", "w")
-        process = subprocess.Popen([f"/usr/bin/dask-{program}", "--scheduler-file", cls.scheduler, "--no-dashboard", *options],
-                                   cwd=cls.folder, stdout=log, stderr=log)
-        log.close()
+        command = [f"/usr/bin/dask-{program}", "--host", "127.0.0.1", "--scheduler-file", cls.scheduler, *options]
+        with open(cls.folder / f"{program}-{len(cls.started)}.log", "w") as log:
+            process = subprocess.Popen([*command, "--no-dashboard"], cwd=cls.folder, stdout=log, stderr=log)
         cls.started.append(process)
         return process
 
-    @classmethod
-    def start_worker(cls):
-        return cls.start("worker", "--nthreads", "1", "--no-nanny", "--host", "127.0.0.1")
-
     def decoding(self, source, into, kind="stats"):
-        return subprocess.Popen([EXAMPLES / "decode.py", self.scheduler, source, "--into", self.folder / into,
-                                 "--kind", kind, "--kspdump", KSPDUMP],
-                                stdout=subprocess.PIPE, stderr=subprocess.PIPE, text=True)
+        command = [PROGRAMS / "decode.py", self.scheduler, source, "--into", self.folder / into]
+        return subprocess.Popen([*command, "--kind", kind, "--kspdump", KSPDUMP], text=True,
+                                stdout=subprocess.PIPE, stderr=subprocess.PIPE)
 
-    def decode(self, *arguments):
+    def decode(self, *arguments, status, words=""):
         program = self.decoding(*arguments)
         out, err = program.communicate(timeout=DEADLINE)
-        return program.returncode, out, err
+        self.assertEqual(program.returncode, status, out + err)
+        self.assertIn(words, " ".join((out + err).split()))
 
     def select(self, *arguments):
-        return subprocess.run([EXAMPLES / "select.py", self.folder / "units", *arguments, "--csv"],
+        return subprocess.run([PROGRAMS / "select.py", self.folder / "units", *arguments, "--csv"],
                               capture_output=True, text=True, timeout=DEADLINE)
+
+    def rows(self, columns, *arguments):
+        rows = csv.DictReader(self.select(*arguments).stdout.splitlines())
+        return [tuple(row[column] for column in columns.split(",")) for row in rows]
 
     def parts(self, into):
         return {path: os.stat(path).st_mtime_ns for path in glob.glob(f"{self.folder / into}/*.jsonl.gz")}
+
+    def wait_for_parts(self, into, count):
+        end = time.monotonic() + DEADLINE
+        while len(self.parts(into)) < count:
+            self.assertLess(time.monotonic(), end)
+            time.sleep(0.01)
+        self.assertLess(len(self.parts(into)), COUNT / 200, "this is not the middle")
 
     def documents(self, into):
         return sorted(line for part in self.parts(into) for line in gzip.open(part))
 
     def test_a_fleet_survives_an_interruption_and_the_death_of_a_worker(self):
-        program = self.decoding(self.fleet, "table")
-        wait_for(lambda: len(self.parts("table")) >= 2, "first parts")
+        fleet = self.folder / "fleet"
+        fleet.mkdir()
+        subprocess.run([GENERATOR, fleet, "--fleet", str(COUNT)], check=True)
+        for unit in CUT:
+            os.truncate(fleet / f"unit-{100000 + unit}.stats", 20004)
+        unreadable = fleet / "unit-099999.stats.gz"
+        unreadable.write_bytes(gzip.compress((fleet / "unit-100000.stats").read_bytes())[:1000])
+        for other in ["monday.media", "day.snapshot"]:
+            shutil.copy(CAPTURES / other, fleet)
+        bundled = sorted(file.name for file in fleet.glob("unit-1*"))[:BUNDLED]
+        subprocess.run(["tar", "--remove-files", "-C", fleet, "-czf", fleet / "bundle.tgz", *bundled], check=True)
+
+        program = self.decoding(fleet, "table")
+        self.wait_for_parts("table", 2)
         program.send_signal(signal.SIGINT)
         self.assertIn("interrupted", program.communicate(timeout=DEADLINE)[1])
         self.assertEqual(program.returncode, 130)
 
         before = self.parts("table")
-        program = self.decoding(self.fleet, "table")
-        wait_for(lambda: len(self.parts("table")) >= len(before) + 2, "further parts")
-        self.workers.pop().kill()
-        self.assertLess(len(self.parts("table")), CAPTURES / 200)
-        out, err = program.communicate(timeout=DEADLINE)
-        self.assertEqual((program.returncode, err), (3, ""))
-        self.workers.append(self.start_worker())
-        self.assertEqual(before.items() - self.parts("table").items(), set())
-        self.assertEqual(glob.glob(f"{self.folder}/table/**/.*", recursive=True), [])
-
+        program = self.decoding(fleet, "table")
+        self.wait_for_parts("table", len(before) + 2)
+        self.workers[0].kill()
+        self.assertEqual(program.communicate(timeout=DEADLINE)[1], "")
         after = self.parts("table")
-        status, out, err = self.decode(self.fleet, "table")
-        self.assertEqual((status, self.parts("table")), (3, after))
-        self.assertRegex(out, rf"captures in +{CAPTURES + 1}, {CAPTURES} of.*\ndocuments out +{CAPTURES},.*\nwith findings +3,.*\nunreadable +1,")
+        self.assertEqual(before.items() - after.items(), set(), "what was done was done again")
+        files = COUNT - BUNDLED + 4
+        self.decode(fleet, "table", status=3, words=f"files {files}, {files - 1} of them done before, 2 without stats "
+                    f"captures in {COUNT + 1} documents out {COUNT}, in {self.folder}/table unreadable 1,")
+        self.assertEqual(self.parts("table"), after)
 
-        names = sorted(str(path) for path in self.fleet.iterdir())
-        one = subprocess.run([KSPDUMP, "stats", "--format", "json", *names], capture_output=True, timeout=DEADLINE)
-        self.assertEqual(len(one.stdout.splitlines()), CAPTURES)
+        one = subprocess.run([KSPDUMP, "stats", "--format", "json", fleet], capture_output=True, timeout=DEADLINE)
+        self.assertEqual(len(one.stdout.splitlines()), COUNT)
         self.assertTrue(self.documents("table") == sorted(one.stdout.splitlines(keepends=True)))
-        findings = list(map(json.loads, (self.folder / "table" / "findings.jsonl").read_text().splitlines()))
-        self.assertEqual([finding["source"] for finding in findings],
-                         [str(self.unreadable), *(f"{self.fleet}/unit-{100000 + unit}.stats" for unit in CUT)])
-        self.assertEqual(findings[0]["unreadable"], "No such file or directory")
-        self.assertEqual({finding["findings"][0]["offset"] for finding in findings[1:]}, {20000})
+        lines = (self.folder / "table" / "findings.jsonl").read_text().splitlines()
+        self.assertEqual([(each["source"], "unreadable" in each) for each in map(json.loads, lines)],
+                         [(str(unreadable), True)] + [(f"{fleet}/unit-{100000 + unit}.stats", False) for unit in CUT])
 
     def test_changed_captures_are_decoded_again_and_units_selected(self):
         greatest = 2**64 - 1
-        units = {"2026-11-21/rack/a.stats": (10, 1), "2026-11-21/b.stats": (1, greatest), "2026-11-21/only.stats": (5, 5),
-                 "2026-11-22/rack/a.stats": (13, 1), "2026-11-22/b.stats": (5, 5)}
-        for name, (writes, erases) in units.items():
+
+        def write(name, writes, erases):
             path = self.folder / "days" / name
             path.parent.mkdir(parents=True, exist_ok=True)
-            path.write_bytes(stats(hostWrites=writes, bandErases=erases))
-        self.assertEqual(self.decode("days", "units")[0], 3, "a relative source is of this folder, not the test's")
-        status, out, err = self.decode(self.folder / "days", "units")
-        self.assertEqual((status, err), (0, ""))
-        (self.folder / "days" / "2026-11-22" / "b.stats").write_bytes(stats(hostWrites=2, bandErases=0))
-        self.assertEqual(self.decode(self.folder / "days", "units")[0], 0)
-        self.assertEqual(len(self.documents("units")), len(units))
+            path.write_bytes(struct.pack("<IIQIIQ", 4, 1, writes, 20, 1, erases))
 
-        moved = list(csv.DictReader(self.select("bandErases", "--moved", "2026-11-21", "2026-11-22").stdout.splitlines()))
-        self.assertEqual([(row["unit"], row["old"], row["new"], row["delta"]) for row in moved],
+        write("2026-11-21/rack/a.stats", 10, 1)
+        write("2026-11-21/b.stats", 1, greatest)
+        write("2026-11-21/only.stats", 5, 5)
+        write("2026-11-22/rack/a.stats", 13, 1)
+        write("2026-11-22/b.stats", 5, 5)
+        self.decode(self.folder / "days", "units", status=0)
+        write("2026-11-22/b.stats", 2, 0)
+        self.decode(self.folder / "days", "units", status=0, words="documents out 5,")
+        self.assertEqual(len(self.documents("units")), 5)
+        self.decode(self.folder / "days", "units", "media", status=2, words="holds stats")
+
+        self.assertEqual(self.rows("unit,old,new,delta", "bandErases", "--moved", "2026-11-21", "2026-11-22"),
                          [("b", str(greatest), "0", str(-greatest)), ("a", "1", "1", "0")])
-        (summary,) = csv.DictReader(self.select("hostWrites").stdout.splitlines())
-        self.assertEqual([summary[column] for column in ("key", "captures", "least", "1 %", "50 %", "75 %", "greatest")],
-                         ["4", "5", "1", "1", "5", "10", "13"])
-        self.assertEqual(summary["greatest in"], f"{self.folder}/days/2026-11-22/rack/a.stats")
-        rows = list(csv.DictReader(self.select("bandErases", "--all").stdout.splitlines()))
-        self.assertEqual([(row["unit"], row["day"], row["value"]) for row in rows],
-                         [("b", "2026-11-21", str(greatest)), ("only", "2026-11-21", "5"), ("a", "2026-11-21", "1"),
-                          ("b", "2026-11-22", "0"), ("a", "2026-11-22", "1")])
-        for arguments, words in [(["none"], "no capture has a record none"),
-                                 (["hostWrites", "--moved", "2026-11-21", "2026-11-20"], "no capture is of 2026-11-20"),
-                                 (["hostWrites", "--pattern", "(?P<unit>.*)"], "lacks the groups")]:
-            program = self.select(*arguments)
-            self.assertIn(words, program.stderr)
-            self.assertNotEqual(program.returncode, 0)
-
-        status, out, err = self.decode(self.folder / "days", "units", "media")
-        self.assertEqual(status, 2)
-        self.assertIn("holds stats", err)
+        self.assertEqual(self.rows("key,captures,least,1 %,50 %,75 %,greatest,greatest in", "hostWrites"),
+                         [("4", "5", "1", "1", "5", "10", "13", f"{self.folder}/days/2026-11-22/rack/a.stats")])
+        self.assertEqual(self.rows("unit,day,value", "bandErases", "--all", "--top", "2"),
+                         [("b", "2026-11-21", str(greatest)), ("only", "2026-11-21", "5")])
+        self.assertIn("no capture is of 2026", self.select("bandErases", "--moved", "2026-11-21", "2026-11-20").stderr)
 
 
 if __name__ == "__main__":
-    KSPDUMP, GENERATOR, EXAMPLES = map(pathlib.Path, map(os.path.abspath, sys.argv[1:]))
+    KSPDUMP, GENERATOR, CAPTURES, PROGRAMS = map(pathlib.Path, map(os.path.abspath, sys.argv[1:]))
     unittest.main(argv=sys.argv[:1], verbosity=2)
