@@ -37,6 +37,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     demand(file.activity.retrySeconds >= 1);
     demand(!file.yield.atCheck || *file.yield.atCheck >= 1);
     demand(!file.yield.ioPressurePercent || *file.yield.ioPressurePercent <= 100);
+    demand(file.metricsFile.empty() || file.metricsFile.starts_with('/'));
     for (const host::ControllerSettings& controller : file.controllers) {
       demand(controller.tunnelMethod == 8 || controller.tunnelMethod == 9);
     }

@@ -101,6 +101,8 @@ TEST(HostFile, UnreadableFilesSayWhy) {
   EXPECT_EQ(faultOf("no/such/file"), "no/such/file: cannot be read: No such file or directory");
   EXPECT_EQ(faultOf("/"), "/: cannot be read: it is not a regular file");
   EXPECT_EQ(faultOf("/dev/zero"), "/dev/zero: cannot be read: it is not a regular file");
+  EXPECT_EQ(faultOf("no\xe0\x82\x9b\xf0\x80\x82\x9b"), "no???????: cannot be read: No such file or directory")
+      << "nor one in more bytes than it takes";
   EXPECT_EQ(faultOf("no/such/\x1b\xc2\x9b\x9b\xe2\x82\xac"),
             "no/such/????\xe2\x82\xac: cannot be read: No such file or directory")
       << "no control character is shown, the euro sign is";
