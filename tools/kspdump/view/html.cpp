@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "snapshot/header.h"
+#include "tools/kspdump/series/ratio.h"
 #include "tools/kspdump/view/forms.h"
 #include "tools/kspdump/view/page/page.h"
 #include "tools/kspdump/view/page/picture.h"
@@ -53,6 +54,13 @@ std::string decimal(std::optional<Wide> number, bool withSign = false) {
 std::string rounded(double number, int digits) {
   char text[400];
   return grouped({text, std::to_chars(text, std::end(text), number, std::chars_format::fixed, digits).ptr});
+}
+
+/// With as many digits as its reader can use.
+std::string shortest(double number) {
+  constexpr int kDigits = 6;
+  char text[32];
+  return {text, std::to_chars(text, std::end(text), number, std::chars_format::general, kDigits).ptr};
 }
 
 /// What a value grew by, of a hundred of what it was.
@@ -318,28 +326,61 @@ class Html : public View {
             of.isArray && !isApart);
       }
     }
+    if (series_.points() == 0) return;
+    for (const Ratio& ratio : ratiosOf(series_)) row(ratio);
   }
 
   /// A row with the values of `points_`.
   void row(About about, uint32_t key, std::string_view name, bool isArray) {
     const bool isSeries = about == About::kTrend || about == About::kSnapshot;
-    part("row",
-         {{"class", isArray || isSeries ? "opens" : ""}, {"key", std::to_string(key)}, {"name", name}});
-    std::vector<std::string> numbers = numbersOf(about);
-    auto column = columnsOf(about).begin() + 2;
-    for (const std::string& number : numbers) {
-      part("number", {{"class", (column++)->classes}, {"number", number, kMarkup}});
-    }
     uint32_t elements = 0;
     for (const Values& values : points_) elements = std::max(elements, values.size());
+    const std::vector<std::string> numbers = numbersOf(about);
     std::string json = "{\"key\":";
     appendNumber(json, key);
     json += ",\"name\":";
     appendSafeJson(json, name);
     appendValues(json, isArray);
-    part("row-end", {{"elements", isArray ? std::to_string(elements) : ""},
-                     {"picture", pictureOf(about, isArray, elements), kMarkup},
-                     {"series", json, kMarkup}});
+    appendRow(about, isArray || isSeries, std::to_string(key), name, numbers,
+              isArray ? std::to_string(elements) : "", pictureOf(about, isArray, elements), json);
+  }
+
+  /// A row that is worked out from two of a snapshot's fields.
+  void row(const Ratio& ratio) {
+    constexpr int kDecimals = 2;
+    drawn_.clear();
+    std::string json = "{\"key\":null,\"name\":";
+    appendSafeJson(json, ratio.name);
+    json += ",\"values\":[";
+    double least = std::numeric_limits<double>::infinity();
+    double greatest = -least;
+    for (size_t point = 0; point < series_.points(); ++point) {
+      const auto value = ratioAt(series_, ratio, point);
+      drawn_.push_back(value.value_or(kMissing));
+      if (point != 0) json += ',';
+      json += value ? shortest(*value) : "null";
+      least = std::min(least, value.value_or(least));
+      greatest = std::max(greatest, value.value_or(greatest));
+    }
+    json += "]}";
+    const auto overall = ratioOverall(series_, ratio);
+    if (!overall) return;
+    std::vector<std::string> numbers;
+    for (const double number : {drawn_.front(), drawn_.back(), least, *overall, greatest}) {
+      numbers.push_back(std::isnan(number) ? "" : rounded(number, kDecimals));
+    }
+    appendRow(About::kSnapshot, true, "", ratio.name, numbers, "", drawLine(drawn_), json);
+  }
+
+  void appendRow(About about, bool opens, std::string_view key, std::string_view name,
+                 const std::vector<std::string>& numbers, std::string_view elements, std::string_view picture,
+                 std::string_view json) {
+    part("row", {{"class", opens ? "opens" : ""}, {"key", key}, {"name", name}});
+    auto column = columnsOf(about).begin() + 2;
+    for (const std::string& number : numbers) {
+      part("number", {{"class", (column++)->classes}, {"number", number, kMarkup}});
+    }
+    part("row-end", {{"elements", elements}, {"picture", picture, kMarkup}, {"series", json, kMarkup}});
   }
 
   void appendValues(std::string& json, bool isArray) {

@@ -355,6 +355,7 @@ class TimeCharts {
 
   add(host, group) {
     const chart = {title: group.title, exact: group.lines.map(line => line.values), visible: group.lines.map(() => true)};
+    chart.names = group.lines.map(line => line.name);
     chart.lines = chart.exact.map(values => Float64Array.from(values, asNumber));
     chart.values = group.lines.map(() => make('span', {class: 'value'}));
     // Of lines in several units, those that would lie flat at the bottom have the axis on the right.
@@ -463,7 +464,7 @@ class TimeCharts {
     if (to !== undefined) {
       this.moveTo(Math.min(Math.max(to, 0), last));
       this.said.textContent = this.axis.nameOf(this.cursor) + ': ' +
-        chart.values.map(value => value.parentNode.textContent).join(', ');
+        chart.names.map((name, i) => `${name} ${chart.values[i].textContent}`).join(', ');
     } else if (event.key === '+') {
       const [from, end] = this.window, quarter = (end - from) / 4, middle = this.axis.x[point];
       this.show([...this.windows, [Math.max(middle - quarter, from), Math.min(middle + quarter, end)]]);

@@ -93,12 +93,16 @@ std::string drawLine(const std::vector<double>& values) {
     for (size_t at = 0; at < values.size(); ++at) add(at);
   } else {
     for (size_t column = 0; column < kMostColumns; ++column) {
-      const auto first = values.begin() + static_cast<std::ptrdiff_t>(column * values.size() / kMostColumns);
-      const auto last =
-          values.begin() + static_cast<std::ptrdiff_t>((column + 1) * values.size() / kMostColumns);
-      const auto [low, high] = std::minmax_element(first, last);
-      add(static_cast<size_t>(std::min(low, high) - values.begin()));
-      if (low != high) add(static_cast<size_t>(std::max(low, high) - values.begin()));
+      const size_t first = column * values.size() / kMostColumns;
+      const size_t last = (column + 1) * values.size() / kMostColumns;
+      size_t low = first;
+      size_t high = first;
+      for (size_t at = first; at < last; ++at) {
+        if (std::isnan(values[low]) || values[at] < values[low]) low = at;
+        if (std::isnan(values[high]) || values[at] > values[high]) high = at;
+      }
+      add(std::min(low, high));
+      if (low != high) add(std::max(low, high));
     }
   }
   return picture("<path class=\"line\" d=\"" + path + "\"/>");
