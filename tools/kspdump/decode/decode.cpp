@@ -7,15 +7,6 @@
 
 namespace kspdump {
 
-void Collector::add(uint64_t offset, uint32_t key, std::string_view name, bool isArray,
-                    const Values& values) {
-  ++capture_.recordCount;
-  if (!selection_.selects(name, key, used_)) return;
-  ++capture_.shownCount;
-  records_[count_++] = {offset, key, isArray, name, values};
-  if (count_ == kBatch) handOn();
-}
-
 void Collector::addNumbered(uint64_t offset, uint32_t key, std::string_view prefix, bool isArray,
                             const Values& values) {
   char(&name)[kLongestNumbered] = names_[count_];

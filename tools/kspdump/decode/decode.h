@@ -37,7 +37,13 @@ class Collector {
   Collector& operator=(const Collector&) = delete;
 
   /// A record whose name lasts.
-  void add(uint64_t offset, uint32_t key, std::string_view name, bool isArray, const Values& values);
+  void add(uint64_t offset, uint32_t key, std::string_view name, bool isArray, const Values& values) {
+    ++capture_.recordCount;
+    if (!selection_.isEmpty() && !selection_.selects(name, key, used_)) return;
+    ++capture_.shownCount;
+    records_[count_++] = {offset, key, isArray, name, values};
+    if (count_ == kBatch) handOn();
+  }
 
   /// A record that is named by its key: `prefix`, of a few characters, and the number.
   void addNumbered(uint64_t offset, uint32_t key, std::string_view prefix, bool isArray,

@@ -37,13 +37,4 @@ void findEnd(Capture& capture, const ksp::Ending& ending, const StreamWords& wor
   }
 }
 
-void collect(Collector& collector, const ksp::Record& record, const Values& values) {
-  if (values.empty()) return;
-  if (record.isListed()) {
-    collector.add(record.offset, record.key, record.row->name, record.isArray, values);
-  } else {
-    collector.addNumbered(record.offset, record.key, record.stem, record.isArray, values);
-  }
-}
-
 }  // namespace kspdump

@@ -90,6 +90,13 @@ inline void findSize(Capture& capture, const ksp::Record& record, const StreamWo
 void findEnd(Capture& capture, const ksp::Ending& ending, const StreamWords& words);
 
 /// Hands on a record under its name.
-void collect(Collector& collector, const ksp::Record& record, const Values& values);
+inline void collect(Collector& collector, const ksp::Record& record, const Values& values) {
+  if (values.empty()) return;
+  if (record.isListed()) {
+    collector.add(record.offset, record.key, record.row->name, record.isArray, values);
+  } else {
+    collector.addNumbered(record.offset, record.key, record.stem, record.isArray, values);
+  }
+}
 
 }  // namespace kspdump

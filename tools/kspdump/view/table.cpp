@@ -1,10 +1,12 @@
 // Tables for people.
 
 #include <algorithm>
+#include <array>
 #include <optional>
 #include <string>
 #include <vector>
 
+#include "ksp/detail/decimal.hpp"
 #include "tools/kspdump/view/bars.h"
 #include "tools/kspdump/view/forms.h"
 #include "tools/kspdump/view/grid.h"
@@ -34,8 +36,12 @@ class Table : public View {
   void measure(std::span<const Record> records) override {
     for (const Record& record : records) {
       greatestKey_ = std::max(greatestKey_, record.key);
-      nameWidth_ = std::max(nameWidth_, columnsOf(shown(record.name)));
-      greatestSum_ = std::max(greatestSum_, sum(record.values));
+      nameWidth_ = std::max(nameWidth_, shownName(record).columns);
+      if (const auto total = narrowSum(record.values)) {
+        greatestNarrow_ = std::max(greatestNarrow_, *total);
+      } else {
+        greatestSum_ = std::max(greatestSum_, sum(record.values));
+      }
     }
   }
 
@@ -55,6 +61,7 @@ class Table : public View {
     expands_ = options_.expands || (options_.isTerminal && capture.shownCount <= kFew);
     keyWidth_ = std::max<size_t>(kLeastKey, std::to_string(greatestKey_).size());
     nameWidth_ = std::max(nameWidth_, kNameHead.size());
+    greatestSum_ = std::max(greatestSum_, Wide(greatestNarrow_));
     valueWidth_ = std::max(kValueHead.size(), greatestSum_.text().size());
     const size_t numbers = keyWidth_ + valueWidth_ + 3 * kGap + kLeastBars;
     if (options_.isTerminal) {
@@ -74,16 +81,25 @@ class Table : public View {
   void records(std::span<const Record> records) override {
     std::string& out = sink_.text;
     for (const Record& record : records) {
-      const Wide total = sum(record.values);
-      addCell(std::to_string(record.key), keyWidth_, true);
-      addCell(cutTo(shown(record.name), nameWidth_), nameWidth_, false);
-      appendPadded(out, total.text(), valueWidth_, true);
+      const std::optional<uint64_t> narrow = narrowSum(record.values);
+      addNumber(record.key, keyWidth_);
+      out.append(kGap, ' ');
+      if (const ShownName& name = shownName(record); name.columns <= nameWidth_) {
+        out.append(name.text).append(nameWidth_ - name.columns + kGap, ' ');
+      } else {
+        addCell(cutTo(name.text, nameWidth_), nameWidth_, false);
+      }
+      if (narrow) {
+        addNumber(*narrow, valueWidth_);
+      } else {
+        appendPadded(out, sum(record.values).text(), valueWidth_, true);
+      }
       if (record.isArray) {
         out.append(kGap, ' ');
-        addBars(record.values, total);
+        addBars(record.values, narrow);
       }
       out += '\n';
-      if (expands_ && record.isArray) addElements(record.values, total);
+      if (expands_ && record.isArray) addElements(record.values, sum(record.values));
       sink_.offer();
     }
   }
@@ -92,6 +108,7 @@ class Table : public View {
     addFindings(capture, "");
     greatestKey_ = 0;
     nameWidth_ = 0;
+    greatestNarrow_ = 0;
     greatestSum_ = {};
   }
 
@@ -147,10 +164,11 @@ class Table : public View {
     }
   }
 
-  void addBars(const Values& values, const Wide& total) {
-    if (total * kBarLevels <= Wide(UINT64_MAX)) {
-      narrow_.clear();
-      for (uint32_t i = 0; i < values.size(); ++i) narrow_.push_back(values[i]);
+  void addBars(const Values& values, std::optional<uint64_t> total) {
+    if (total && *total <= UINT64_MAX / kBarLevels) {
+      narrow_.resize(values.size());
+      uint64_t* to = narrow_.data();
+      values.forEach(0, values.size(), [&](uint64_t value) { *to++ = value; });
       appendBars<uint64_t>(sink_.text, narrow_, barWidth_);
     } else {
       wide_.clear();
@@ -159,14 +177,52 @@ class Table : public View {
     }
   }
 
+  /// The sum of values, where 64 bits hold it.
+  static std::optional<uint64_t> narrowSum(const Values& values) {
+    uint64_t sum = 0;
+    bool isWide = false;
+    values.forEach(0, values.size(), [&](uint64_t value) {
+      sum += value;
+      isWide |= sum < value;
+    });
+    if (isWide) return std::nullopt;
+    return sum;
+  }
+
+  void addNumber(uint64_t number, size_t width) {
+    char text[ksp::kDecimalRoom];
+    const auto size = static_cast<size_t>(ksp::writeDecimal(text, number) - text);
+    sink_.text.append(width > size ? width - size : 0, ' ').append(text, size);
+  }
+
+  /// A name as it is shown, kept for the next capture's records of the same name and key.
+  struct ShownName {
+    uint32_t key = 0;
+    std::string name;
+    std::string text;
+    size_t columns = 0;
+  };
+
+  const ShownName& shownName(const Record& record) {
+    ShownName& shownName = shownNames_[record.key % shownNames_.size()];
+    if (shownName.text.empty() || shownName.key != record.key || shownName.name != record.name) {
+      const std::string text = shown(record.name);
+      shownName = {record.key, std::string(record.name), text, columnsOf(text)};
+    }
+    return shownName;
+  }
+
   ViewOptions options_;
   bool expands_ = false;
   uint32_t greatestKey_ = 0;
   size_t nameWidth_ = 0;
+  /// Of the sums that 64 bits hold, and of the others.
+  uint64_t greatestNarrow_ = 0;
   Wide greatestSum_;
   size_t keyWidth_ = 0;
   size_t valueWidth_ = 0;
   size_t barWidth_ = 0;
+  std::array<ShownName, 1024> shownNames_;
   std::vector<uint64_t> narrow_;
   std::vector<Wide> wide_;
 };
