@@ -27,6 +27,7 @@ import os
 import pathlib
 import queue
 import re
+import signal
 import stat
 import subprocess
 import tempfile
@@ -349,6 +350,13 @@ def work(client, parts, arguments, table, progress):
     done, flying = queue.SimpleQueue(), {}
     waiting = iter(parts)
     idle = 0
+
+    # An exception would be lost where the signal arrives in a destructor.
+    def interrupt(*_):
+        signal.signal(signal.SIGINT, signal.default_int_handler)
+        done.put(None)
+
+    signal.signal(signal.SIGINT, interrupt)
     while True:
         while len(flying) < PARTS_IN_FLIGHT and (part := next(waiting, None)):
             name, inputs = part
@@ -366,16 +374,22 @@ def work(client, parts, arguments, table, progress):
             if client.status != "running" or idle > arguments.patience:
                 break
             continue
+        if future is None:
+            raise KeyboardInterrupt
         if future.cancelled():
             break
-        name, inputs = flying.pop(future.key)
-        progress.update(len(inputs))
-        if future.status == "finished":
-            tally, reasons = future.result()
-            table.tallies[name] = tally
+        name, inputs = flying[future.key]
+        try:
+            table.tallies[name], reasons = future.result(timeout=5)
             unreadable |= reasons
-        else:
-            wrong.append(f"{name}, {len(inputs)} files from {inputs[0][0]} on: {future.exception()!r}")
+        except Exception as error:  # whatever went wrong on a worker
+            if future.status != "error":
+                # The worker died with the result; another one makes it anew.
+                future.add_done_callback(done.put)
+                continue
+            wrong.append(f"{name}, {len(inputs)} files from {inputs[0][0]} on: {error!r}")
+        del flying[future.key]
+        progress.update(len(inputs))
     wrong.append("no worker is left" if idle > arguments.patience else "the scheduler is gone")
     return unreadable, wrong
 
