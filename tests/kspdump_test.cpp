@@ -319,10 +319,88 @@ TEST_F(Kspdump, DiffTellsWhatChanged) {
             "new,stats,4,hostWrites,,18446744073709551615,0,-18446744073709551615\n");
   EXPECT_EQ(shell("LC_ALL=C $KSPDUMP diff stats --match 'perHost*' old new").out,
             "old -> new: 1 changed\n"
-            "KEY  NAME          OLD  NEW  DELTA  ELEMENTS\n"
-            "298  perHostReads   16   17     +1  _@\n");
+            "KEY  NAME          OLD  NEW  DELTA     %  ELEMENTS\n"
+            "298  perHostReads   16   17     +1  +6.2  _@\n");
   EXPECT_EQ(run("diff media old new").status, 1);
   EXPECT_EQ(run("diff stats old").status, 2);
+}
+
+TEST_F(Kspdump, ChangesAreRankedAndSigned) {
+  write("old", record(4, {100}) + record(5, {10}) + record(7, {8}) + record(298, {9, 1}) + record(20, {0}));
+  write("new", record(4, {90}) + record(5, {30}) + record(7, {8}) + record(298, {1, 9}) + record(20, {5}));
+  const struct {
+    const char* options;
+    const char* keys;
+  } cases[] = {
+      {"", "[4,5,20,298]"},
+      {"--all", "[4,5,7,20,298]"},
+      {"--sort name", "[20,4,5,298]"},
+      {"--sort change", "[5,4,20,298]"},
+      {"--sort percent", "[5,4,20,298]"},
+      {"--sort change --top 1", "[5]"},
+  };
+  for (const auto& [options, keys] : cases) {
+    json shown = json::array();
+    const json document = json::parse(run(std::string("diff stats --format json old new ") + options).out);
+    for (const json& each : document["changes"]) shown.push_back(each["key"]);
+    EXPECT_EQ(shown, json::parse(keys)) << options;
+  }
+  EXPECT_EQ(shell("LC_ALL=C $KSPDUMP diff stats --key 5 --key 298 old new").out,
+            "old -> new: 2 changed\n"
+            "KEY  NAME           OLD  NEW  DELTA       %  ELEMENTS\n"
+            "  5  hostWritesDyn   10   30    +20  +200.0\n"
+            "298  perHostReads    10   10      0     0.0  V@\n");
+  EXPECT_EQ(json::parse(run("diff summary --format json old new").out)["changes"].size(), 2u);
+}
+
+TEST_F(Kspdump, TrendsGoOverCapturesOrAStatistic) {
+  write("a", record(34, {30}) + record(4, {100}) + record(298, {1, 2}));
+  write("b", record(34, {10}) + record(4, {40}) + record(900, {7}));
+  write("c", record(34, {20}) + record(4, {70}) + record(298, {3, 4}));
+  write("d", record(4, {1}));
+  EXPECT_EQ(json::parse(run("trend stats --format json a b c").out), json::parse(R"({"kind":"stats",
+    "sources":["a","b","c"],"over":null,"findings":[],"series":[{"key":4,"name":"hostWrites","values":[100,40,70]},
+    {"key":34,"name":"powerOnHours","values":[30,10,20]},
+    {"key":298,"name":"perHostReads","values":[[1,2],null,[3,4]]},
+    {"key":900,"name":"Stat_900","values":[null,7,null]}]})"));
+  const Outcome over = run("trend stats --over powerOnHours --format csv --key 4 a b c d");
+  EXPECT_EQ(over.out, "source,over powerOnHours,hostWrites\nb,10,40\nc,20,70\na,30,100\n");
+  EXPECT_EQ(over.err, "kspdump: d: offset 0: there is no value of powerOnHours in it; it is left out\n");
+  EXPECT_EQ(over.status, 1);
+  EXPECT_EQ(shell("LC_ALL=C $KSPDUMP trend stats --over powerOnHours --match hostWrites a b c").out,
+            "statistics, 3 captures, 1 changed, over powerOnHours 10 to 30\n"
+            "KEY  NAME        FIRST  LAST  LEAST  GREATEST  CHANGE       %  PER UNIT  TREND\n"
+            "  4  hostWrites     40   100     40       100     +60  +150.0     3.000  -*@\n");
+  EXPECT_EQ(run("trend stats --format csv --key 298 --key 900 a b").out,
+            "source,perHostReads_0,perHostReads_1,Stat_900\na,1,2,\nb,,,7\n");
+  EXPECT_EQ(run("trend stats a").status, 2);
+  EXPECT_EQ(run("trend stats a missing c").status, 3);
+}
+
+TEST_F(Kspdump, SnapshotsAreSeriesInTheOrderOfTime) {
+  // A ring: the oldest record stands behind the newest, and one slot is not in use yet.
+  const auto at = [](uint64_t time, uint64_t hostWrites, uint64_t mediaWrites) {
+    std::string bytes = interval(time);
+    bytes.replace(4 * 28, 4, numbers<4>({hostWrites}));
+    bytes.replace(4 * 30, 4, numbers<4>({mediaWrites}));
+    return bytes;
+  };
+  write("ring", at(30, 4, 2) + at(40, 2, 8) + at(10, 0, 0) + at(20, 4, 4) + std::string(252, '\0'));
+  EXPECT_EQ(run("snapshot --format csv --match T --match '[HN]W' --match BF ring").out,
+            "record,T,HW,NW,BF_0,BF_1\n2,10,0,0,0,0\n3,20,4,4,0,0\n0,30,4,2,0,0\n1,40,2,8,0,0\n");
+  EXPECT_EQ(shell("LC_ALL=C COLUMNS=60 $KSPDUMP snapshot --format chart --match T --match '[HN]W' ring").out,
+            "ring: snapshot, 4 intervals\n"
+            "NAME   LEAST   MEAN  GREATEST\n"
+            "T         10  25.00        40  .=*@\n"
+            "HW         0   2.50         4  _@@=\n"
+            "NW         0   3.50         8  _=.@\n"
+            "NW/HW   0.50   1.40      4.00   ..@\n");
+  std::istringstream lines(shell("COLUMNS=80 $KSPDUMP snapshot --format chart " KSP_EXAMPLE_CAPTURES "/day.snapshot").out);
+  size_t count = 0;
+  for (std::string line; std::getline(lines, line); ++count) {
+    EXPECT_LE(line.size() - static_cast<size_t>(std::count_if(line.begin(), line.end(), [](char c) { return (c & 0xC0) == 0x80; })), 80u) << line;
+  }
+  EXPECT_GT(count, 50u);
 }
 
 TEST_F(Kspdump, OutputIsWholeOrNotThere) {

@@ -30,11 +30,13 @@ enum : unsigned {
   kMedia = 4,
   kSnapshot = 8,
   kDiff = 16,
-  kIdentify = 32,
-  kKeys = 64,
+  kTrend = 32,
+  kIdentify = 64,
+  kKeys = 128,
   kMany = kStats | kSummary | kMedia,
   kDecoders = kMany | kSnapshot,
-  kSelecting = kDecoders | kDiff,
+  kSeries = kDiff | kTrend,
+  kSelecting = kDecoders | kSeries,
   kReading = kSelecting | kIdentify,
   kAll = kReading | kKeys,
 };
@@ -55,6 +57,7 @@ constexpr Command kCommands[] = {
     {"snapshot", kSnapshot, "SOURCE", "Show a snapshot: the fixed layout, or a header's", Subject::kSnapshot},
     {"diff", kDiff, "stats|summary|media OLD NEW", "Show what changed between two captures",
      Subject::kDifference},
+    {"trend", kTrend, "stats|summary|media SOURCE...", "Show how values went over captures", Subject::kTrend},
     {"identify", kIdentify, "SOURCE...", "Tell which kind of capture each is", Subject::kListing},
     {"keys", kKeys, "stats|media [GLOB]", "List the keys that have a name", Subject::kListing},
 };
@@ -151,6 +154,30 @@ constexpr OptionRow kOptions[] = {
        wanted.options.expands = true;
        return "";
      }},
+    {"sort", "ORDER", kSeries, "By key, name, change or percent", "key",
+     [](Wanted& wanted, const std::string& value) -> std::string {
+       constexpr std::string_view kOrders[] = {"key", "name", "change", "percent"};
+       const auto order = std::find(std::begin(kOrders), std::end(kOrders), value);
+       if (order == std::end(kOrders)) return "takes key, name, change or percent";
+       wanted.options.ranking.order = static_cast<Ranking::Order>(order - std::begin(kOrders));
+       return "";
+     }},
+    {"top", "N", kSeries, "Only the first N", "all",
+     [](Wanted& wanted, const std::string& value) -> std::string {
+       return readNumber(value, wanted.options.ranking.most) && wanted.options.ranking.most != 0
+                  ? ""
+                  : "takes a number from 1 on";
+     }},
+    {"all", nullptr, kSeries, "Those that do not change, too", "what changes",
+     [](Wanted& wanted, const std::string&) -> std::string {
+       wanted.options.ranking.withUnchanged = true;
+       return "";
+     }},
+    {"over", "NAME", kTrend, "In order of a statistic's value", "as given",
+     [](Wanted& wanted, const std::string& value) -> std::string {
+       wanted.options.over = value;
+       return "";
+     }},
     {"numbers", nullptr, kStats, "Name records by their key number", "by name",
      [](Wanted& wanted, const std::string&) -> std::string {
        wanted.options.decoding.byNumber = true;
@@ -166,7 +193,8 @@ constexpr OptionRow kOptions[] = {
        wanted.options.label = value;
        return "";
      }},
-    {"files0-from", "LIST", kMany | kIdentify, "More sources, NUL-terminated, from a file or -", "none",
+    {"files0-from", "LIST", kMany | kTrend | kIdentify, "More sources, NUL-terminated, from a file or -",
+     "none",
      [](Wanted& wanted, const std::string& value) -> std::string {
        wanted.options.sourcesFrom = value;
        return "";
@@ -366,6 +394,10 @@ class CommandLine {
           throw UsageError("diff takes two captures, OLD NEW, but got " + listed());
         }
         return;
+      case kTrend:
+        options.task = Task::kTrend;
+        takeKind("SOURCE...", kMany);
+        return takeSources();
       case kIdentify:
         options.task = Task::kIdentify;
         return takeSources();

@@ -211,6 +211,76 @@ Result showCaptures(const Options& options, const ViewOptions& viewOptions, Outp
   return Captures(options, viewOptions, output).show();
 }
 
+/// Captures in a row, as they are read.
+class Row {
+ public:
+  Row(const Options& options, bool showsFindings) : options_(options), showsFindings_(showsFindings) {}
+
+  void add(const Input& input) {
+    if (input.state == Input::State::kFault) {
+      complain(input.name, "cannot be read: " + input.fault);
+      isUnreadable_ = true;
+      return;
+    }
+    Capture capture;
+    capture.source = input.name;
+    capture.kind = options_.decoding.kind;
+    capture.bytes = input.bytes;
+    std::optional<uint64_t> over;
+    if (!options_.over.empty()) over = valueOver(capture);
+    const bool isLeftOut = !options_.over.empty() && !over;
+    Series* const series = isLeftOut ? nullptr : &series_;
+    if (series != nullptr) series->begin(capture);
+    decode(options_.decoding, capture, [&](std::span<const Record> records) {
+      if (series != nullptr) series->records(records);
+    });
+    if (isLeftOut) capture.find(0, "there is no value of " + options_.over + " in it; it is left out");
+    if (series != nullptr) series->end(capture);
+    if (over) over_.values.push_back(*over);
+    if (capture.isClean()) return;
+    hasFindings_ = true;
+    if (!showsFindings_ || isLeftOut) tell(capture.source, capture.findings, capture.furtherFindings);
+  }
+
+  /// Throws UsageError where there are fewer than two.
+  Series& finish() {
+    const size_t points = series_.captures().size();
+    if (points < 2)
+      throw UsageError("a trend takes two captures or more, and there is " + counted(points, "capture"));
+    series_.rank(options_.ranking);
+    if (!options_.over.empty()) {
+      over_.name = options_.over;
+      series_.goOver(over_);
+    }
+    return series_;
+  }
+
+  [[nodiscard]] bool isUnreadable() const { return isUnreadable_; }
+  [[nodiscard]] int status() const { return isUnreadable_ ? kUnreadable : hasFindings_ ? kFindings : kClean; }
+
+ private:
+  /// The value of the statistic that the series goes over, selected or not.
+  std::optional<uint64_t> valueOver(Capture capture) const {
+    std::optional<uint64_t> value;
+    Decoding all = options_.decoding;
+    all.selection = {};
+    decode(all, capture, [&](std::span<const Record> records) {
+      for (const Record& record : records) {
+        if (record.name == options_.over && !record.isArray && !record.values.empty())
+          value = record.values[0];
+      }
+    });
+    return value;
+  }
+
+  const Options& options_;
+  bool showsFindings_;
+  Series series_;
+  Over over_;
+  bool isUnreadable_ = false;
+  bool hasFindings_ = false;
+};
+
 Result showSeries(const Options& options, const ViewOptions& viewOptions, Output& output) {
   Sink sink;
   sink.drain = [&](std::string& text) {
@@ -218,35 +288,25 @@ Result showSeries(const Options& options, const ViewOptions& viewOptions, Output
     text.clear();
   };
   const std::unique_ptr<View> view = options.form->make(viewOptions, sink);
-  Series series;
-  Result result = {.status = kClean, .isDecoded = true};
-  Input input;
-  for (const std::string& source : options.sources) {
-    input.fault = readFile(source, input.bytes, readingOf(options));
-    if (!input.fault.empty()) {
-      complain(source, "cannot be read: " + input.fault);
-      result = {.status = kUnreadable, .isDecoded = false};
-      continue;
-    }
-    Capture capture;
-    capture.source = source;
-    capture.kind = options.decoding.kind;
-    capture.bytes = input.bytes;
-    series.begin(capture);
-    decode(options.decoding, capture, [&](std::span<const Record> records) { series.records(records); });
-    series.end(capture);
-    if (capture.isClean()) continue;
-    result.status = std::max<int>(result.status, kFindings);
-    if (!view->showsFindings()) tell(capture.source, capture.findings, capture.furtherFindings);
-  }
-  if (!result.isDecoded) return result;
+  Row row(options, view->showsFindings());
   if (options.task == Task::kDifference) {
-    view->difference(series);
+    for (const std::string& source : options.sources) {
+      Input input = loadOne(source, readingOf(options));
+      row.add(input);
+    }
+    if (row.isUnreadable()) return {.status = row.status(), .isDecoded = false};
+    view->difference(row.finish());
   } else {
-    view->trend(series);
+    showInOrder(sourcesOf(options),
+                {.reading = readingOf(options),
+                 .jobs = 1,
+                 .makeShow = [&](Lane&) -> ShowInput { return [&](Input& input) { row.add(input); }; },
+                 .write = [](std::string_view) {},
+                 .found = [](const Found&) {}});
+    view->trend(row.finish());
   }
   sink.drain(sink.text);
-  return result;
+  return {.status = row.status(), .isDecoded = true};
 }
 
 /// The keys of one stream's table that are selected.
@@ -365,8 +425,10 @@ int run(const Options& asked) {
     options.decoding.header = header;
   }
   Output output(options.output);
-  const ViewOptions viewOptions = {
-      .width = lineWidth(), .isTerminal = output.isTerminal(), .expands = options.expands};
+  const ViewOptions viewOptions = {.width = lineWidth(),
+                                   .isTerminal = output.isTerminal(),
+                                   .expands = options.expands,
+                                   .isSnapshot = options.decoding.kind == Kind::kSnapshot};
   const auto task = [&] {
     switch (options.task) {
       case Task::kKeys:

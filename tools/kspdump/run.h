@@ -23,6 +23,9 @@ struct Options {
   const Form* form = nullptr;
   /// Of `kKeys`, whose keys, and which.
   Decoding decoding;
+  /// Of series, what is shown of them, and the statistic that a trend goes over; empty for the order given.
+  Ranking ranking;
+  std::string over;
   /// Whether each element of an array has a row of its own.
   bool expands = false;
 

@@ -1,6 +1,7 @@
 #include "tools/kspdump/series/series.h"
 
 #include <algorithm>
+#include <cmath>
 #include <numeric>
 
 namespace kspdump {
@@ -32,9 +33,44 @@ void Series::records(std::span<const Record> records) {
 
 void Series::end(const Capture& capture) {
   captures_.back() = capture;
-  if (isSnapshot_) return;
+  if (isSnapshot_) return putInTime(capture);
   captures_.back().bytes = {};
   copies_.back().shrink_to_fit();
+}
+
+void Series::putInTime(const Capture& capture) {
+  const bool isFixed = capture.header.empty();
+  if (intervals_.empty() || !(isFixed || tracks_.front().name == "T")) return;
+  // The timestamp is the first word of the fixed layout, shown or not.
+  const Values time = isFixed ? Values(capture.bytes.data(), 1, 4, 4) : fields_.front();
+  const auto timeOf = [&](const Interval& interval) {
+    return time.movedBy(static_cast<std::ptrdiff_t>(interval.offset) -
+                        static_cast<std::ptrdiff_t>(isFixed ? 0 : fieldsOffset_))[0];
+  };
+  std::erase_if(intervals_, [&](const Interval& interval) { return timeOf(interval) == 0; });
+  const auto isEarlier = [&](const Interval& a, const Interval& b) { return timeOf(a) < timeOf(b); };
+  // A ring of records has its oldest one behind its newest.
+  const auto oldest = std::is_sorted_until(intervals_.begin(), intervals_.end(), isEarlier);
+  if (std::is_sorted(oldest, intervals_.end(), isEarlier))
+    std::rotate(intervals_.begin(), oldest, intervals_.end());
+}
+
+void Series::goOver(const Over& over) {
+  std::vector<size_t> order(captures_.size());
+  std::iota(order.begin(), order.end(), size_t{0});
+  std::stable_sort(order.begin(), order.end(),
+                   [&](size_t a, size_t b) { return over.values[a] < over.values[b]; });
+  Series sorted;
+  over_ = Over{over.name, {}};
+  for (const size_t point : order) {
+    over_->values.push_back(over.values[point]);
+    sorted.captures_.push_back(std::move(captures_[point]));
+    sorted.copies_.push_back(std::move(copies_[point]));
+    sorted.cells_.push_back(std::move(cells_[point]));
+  }
+  captures_ = std::move(sorted.captures_);
+  copies_ = std::move(sorted.copies_);
+  cells_ = std::move(sorted.cells_);
 }
 
 void Series::addInterval(const Record& record) {
@@ -42,6 +78,7 @@ void Series::addInterval(const Record& record) {
     intervals_.push_back({record.offset, record.key});
   }
   if (intervals_.size() > 1) return;
+  fieldsOffset_ = record.offset;
   tracks_.push_back({static_cast<uint32_t>(tracks_.size()), std::string(record.name), record.isArray,
                      record.values.size()});
   fields_.push_back(record.values);
@@ -54,17 +91,31 @@ size_t Series::trackOf(const Record& record) {
 }
 
 std::vector<size_t> Series::tracksInOrder() const {
-  std::vector<size_t> order(tracks_.size());
-  std::iota(order.begin(), order.end(), size_t{0});
-  std::stable_sort(order.begin(), order.end(),
-                   [&](size_t a, size_t b) { return tracks_[a].key < tracks_[b].key; });
+  std::vector<size_t> order;
+  for (size_t track = 0; track < tracks_.size(); ++track) {
+    if (isSnapshot_ || ranking_.withUnchanged || points() == 1 || changes(track)) order.push_back(track);
+  }
+  const auto sortBy = [&](auto isBefore) { std::stable_sort(order.begin(), order.end(), isBefore); };
+  sortBy([&](size_t a, size_t b) { return tracks_[a].key < tracks_[b].key; });
+  if (ranking_.order == Ranking::Order::kName) {
+    sortBy([&](size_t a, size_t b) { return tracks_[a].name < tracks_[b].name; });
+  } else if (ranking_.order == Ranking::Order::kChange) {
+    std::vector<Wide> changes(tracks_.size());
+    for (const size_t track : order) changes[track] = change(track).value_or(Wide()).magnitude();
+    sortBy([&](size_t a, size_t b) { return changes[a] > changes[b]; });
+  } else if (ranking_.order == Ranking::Order::kPercent) {
+    std::vector<double> percents(tracks_.size());
+    for (const size_t track : order) percents[track] = std::abs(percent(track).value_or(-0.0));
+    sortBy([&](size_t a, size_t b) { return percents[a] > percents[b]; });
+  }
+  if (ranking_.most != 0 && order.size() > ranking_.most) order.resize(ranking_.most);
   return order;
 }
 
 Values Series::values(size_t track, size_t point) const {
   if (isSnapshot_) {
     return fields_[track].movedBy(static_cast<std::ptrdiff_t>(intervals_[point].offset) -
-                                  static_cast<std::ptrdiff_t>(intervals_.front().offset));
+                                  static_cast<std::ptrdiff_t>(fieldsOffset_));
   }
   if (track >= cells_[point].size()) return {};
   const Cell& cell = cells_[point][track];
@@ -88,6 +139,20 @@ std::optional<Wide> Series::delta(size_t track, uint32_t element) const {
   const auto last = value(track, points() - 1, element);
   if (!first || !last) return std::nullopt;
   return Wide(*last) - Wide(*first);
+}
+
+std::optional<Wide> Series::change(size_t track) const {
+  const auto first = sum(track, 0);
+  const auto last = sum(track, points() - 1);
+  if (!first || !last) return std::nullopt;
+  return *last - *first;
+}
+
+std::optional<double> Series::percent(size_t track) const {
+  constexpr double kWhole = 100;
+  const auto grown = change(track);
+  if (!grown || *sum(track, 0) == Wide()) return std::nullopt;
+  return static_cast<double>(*grown) / static_cast<double>(*sum(track, 0)) * kWhole;
 }
 
 bool Series::changes(size_t track) const {

@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "tools/kspdump/decode/capture.h"
+#include "tools/kspdump/series/ranking.h"
 #include "tools/kspdump/series/wide.h"
 
 namespace kspdump {
@@ -35,6 +36,14 @@ class Series {
   void records(std::span<const Record> records);
   void end(const Capture& capture);
 
+  /// Says which tracks are shown.
+  void rank(const Ranking& ranking) { ranking_ = ranking; }
+  [[nodiscard]] bool showsUnchanged() const { return ranking_.withUnchanged; }
+  /// Puts captures in ascending order of a statistic, `over.values` being those in the order given.
+  void goOver(const Over& over);
+  /// Null where the series goes in the order given.
+  [[nodiscard]] const Over* over() const { return over_ ? &*over_ : nullptr; }
+
   [[nodiscard]] Kind kind() const { return captures_.front().kind; }
   /// What was read, with its findings: a capture a point or, of a snapshot, one for all points.
   [[nodiscard]] const std::vector<Capture>& captures() const { return captures_; }
@@ -45,7 +54,8 @@ class Series {
 
   /// In the order in which they came first.
   [[nodiscard]] const std::vector<Track>& tracks() const { return tracks_; }
-  /// The tracks' indices in ascending order of keys.
+  /// The tracks to show, as they were ranked; in ascending order of keys those that change where they were
+  /// not.
   [[nodiscard]] std::vector<size_t> tracksInOrder() const;
 
   /// The values of a track at a point; empty where it has none.
@@ -56,6 +66,10 @@ class Series {
   [[nodiscard]] std::optional<Wide> sum(size_t track, size_t point) const;
   /// What an element grew by from the first point to the last; none where it is missing at one.
   [[nodiscard]] std::optional<Wide> delta(size_t track, uint32_t element) const;
+  /// What the sum grew by from the first point to the last; none where it is missing at one.
+  [[nodiscard]] std::optional<Wide> change(size_t track) const;
+  /// That in percent of the first; none where that is 0.
+  [[nodiscard]] std::optional<double> percent(size_t track) const;
   /// Whether a track has not the same values at all points.
   [[nodiscard]] bool changes(size_t track) const;
 
@@ -74,7 +88,11 @@ class Series {
   void addInterval(const Record& record);
   size_t trackOf(const Record& record);
 
+  void putInTime(const Capture& capture);
+
   bool isSnapshot_ = false;
+  Ranking ranking_;
+  std::optional<Over> over_;
   std::vector<Capture> captures_;
   std::vector<Track> tracks_;
 
@@ -84,8 +102,10 @@ class Series {
   std::map<std::pair<uint32_t, size_t>, size_t> trackOfKey_;
   std::map<uint32_t, size_t> seen_;
 
-  // Of a snapshot, the fields of the first interval; the others' lie at the same distance.
+  // Of a snapshot, the fields of the first interval that was handed over; the others' lie at the same
+  // distance.
   std::vector<Values> fields_;
+  uint64_t fieldsOffset_ = 0;
   std::vector<Interval> intervals_;
 };
 

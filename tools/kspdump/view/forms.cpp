@@ -12,9 +12,10 @@ using enum Subject;
 /// A subject's first form is the one it is shown in where none is asked for.
 const Form kForms[] = {
     {"report", makeReport, {kSnapshot}},
-    {"table", makeTable, {kStatistics, kSnapshot, kDifference, kListing}},
-    {"json", makeJson, {kStatistics, kSnapshot, kDifference, kListing}},
-    {"csv", makeCsv, {kStatistics, kSnapshot, kDifference, kListing}},
+    {"table", makeTable, {kStatistics, kSnapshot, kDifference, kTrend, kListing}},
+    {"json", makeJson, {kStatistics, kSnapshot, kDifference, kTrend, kListing}},
+    {"chart", makeChart, {kSnapshot, kTrend}},
+    {"csv", makeCsv, {kStatistics, kSnapshot, kDifference, kTrend, kListing}},
     {"html", makeHtml, {kStatistics, kSnapshot, kDifference, kTrend}},
     {"openmetrics", makeMetrics, {kStatistics, kSnapshot}},
 };

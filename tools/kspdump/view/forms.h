@@ -9,6 +9,7 @@ namespace kspdump {
 /// One maker a form, each in the file of its name.
 std::unique_ptr<View> makeTable(const ViewOptions& options, Sink& sink);
 std::unique_ptr<View> makeReport(const ViewOptions& options, Sink& sink);
+std::unique_ptr<View> makeChart(const ViewOptions& options, Sink& sink);
 std::unique_ptr<View> makeJson(const ViewOptions& options, Sink& sink);
 std::unique_ptr<View> makeCsv(const ViewOptions& options, Sink& sink);
 std::unique_ptr<View> makeHtml(const ViewOptions& options, Sink& sink);

@@ -80,7 +80,6 @@ class Json : public View {
     out.append(",\"kind\":\"").append(kindName(series.kind())).append("\",\"changes\":[");
     const char* separator = "";
     for (const size_t track : series.tracksInOrder()) {
-      if (!series.changes(track)) continue;
       const Track& about = series.tracks()[track];
       out.append(separator).append("{\"key\":");
       separator = ",";
@@ -98,6 +97,60 @@ class Json : public View {
     out += ',';
     appendFindings(out, "new_findings", after);
     out += "}\n";
+  }
+
+  void trend(const Series& series) override {
+    std::string& out = sink_.text;
+    out.append("{\"kind\":\"").append(kindName(series.kind())).append("\",\"sources\":[");
+    for (size_t point = 0; point < series.points(); ++point) {
+      if (point != 0) out += ',';
+      appendJson(out, series.captures()[point].source);
+    }
+    out += "],\"over\":";
+    if (const Over* over = series.over()) {
+      out += "{\"name\":";
+      appendJson(out, over->name);
+      out += ",\"values\":[";
+      for (size_t point = 0; point < over->values.size(); ++point) {
+        if (point != 0) out += ',';
+        appendNumber(out, over->values[point]);
+      }
+      out += "]}";
+    } else {
+      out += "null";
+    }
+    out += ",\"series\":[";
+    const char* separator = "";
+    for (const size_t track : series.tracksInOrder()) {
+      const Track& about = series.tracks()[track];
+      out.append(separator).append("{\"key\":");
+      separator = ",";
+      appendNumber(out, about.key);
+      out += ",\"name\":";
+      appendJson(out, about.name);
+      out += ",\"values\":[";
+      for (size_t point = 0; point < series.points(); ++point) {
+        if (point != 0) out += ',';
+        addPoint(about, series.values(track, point));
+      }
+      out += "]}";
+      sink_.offer();
+    }
+    out += "],\"findings\":[";
+    separator = "";
+    for (const Capture& capture : series.captures()) {
+      for (const Finding& finding : capture.findings) {
+        out.append(separator).append("{\"source\":");
+        separator = ",";
+        appendJson(out, capture.source);
+        out += ",\"offset\":";
+        appendNumber(out, finding.offset);
+        out += ",\"reason\":";
+        appendJson(out, finding.reason);
+        out += '}';
+      }
+    }
+    out += "]}\n";
   }
 
   void listing(const Listing& listing) override {
@@ -121,6 +174,21 @@ class Json : public View {
   [[nodiscard]] bool showsFindings() const override { return true; }
 
  private:
+  /// A track at a point: a number or, of an array, a list; null where it is missing.
+  void addPoint(const Track& track, const Values& values) {
+    std::string& out = sink_.text;
+    if (values.empty()) {
+      out += "null";
+      return;
+    }
+    if (track.isArray) out += '[';
+    for (uint32_t i = 0; i < values.size(); ++i) {
+      if (i != 0) out += ',';
+      appendNumber(out, values[i]);
+    }
+    if (track.isArray) out += ']';
+  }
+
   static constexpr std::string_view kRecordEnd = "]}";
 
   /// What stands between the values of a record and those of the one before, kept for the next capture's

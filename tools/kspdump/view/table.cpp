@@ -25,6 +25,10 @@ std::string decimal(std::optional<Wide> number, bool withSign = false) {
   return (withSign && *number > Wide() ? "+" : "") + number->text();
 }
 
+std::string percent(std::optional<double> number) {
+  return number ? (*number > 0 ? "+" : "") + fixed(*number, 1) : "-";
+}
+
 class Table : public View {
  public:
   Table(const ViewOptions& options, Sink& sink) : View(sink), options_(options) {}
@@ -113,11 +117,15 @@ class Table : public View {
   }
 
   void difference(const Series& series) override;
+  void trend(const Series& series) override;
   void listing(const Listing& listing) override;
 
   [[nodiscard]] bool showsFindings() const override { return true; }
 
  private:
+  template <class AddPicture>
+  void addRows(Grid& grid, std::string_view pictures, AddPicture addPicture);
+
   static constexpr std::string_view kKeyHead = "KEY";
   static constexpr std::string_view kNameHead = "NAME";
   static constexpr std::string_view kValueHead = "VALUE/SUM";
@@ -228,43 +236,101 @@ class Table : public View {
 };
 
 void Table::difference(const Series& series) {
+  std::string& out = sink_.text;
+  const std::vector<size_t> tracks = series.tracksInOrder();
+  out += printable(series.captures().front().source) + " -> " + printable(series.captures().back().source) +
+         ": " + std::to_string(tracks.size()) + (series.showsUnchanged() ? " shown\n" : " changed\n");
+  Grid grid({{"KEY", true}, {"NAME", false}, {"OLD", true}, {"NEW", true}, {"DELTA", true}, {"%", true}});
+  for (const size_t track : tracks) {
+    grid.add({std::to_string(series.tracks()[track].key), shown(series.tracks()[track].name),
+              decimal(series.sum(track, 0)), decimal(series.sum(track, 1)),
+              decimal(series.change(track), true), percent(series.percent(track))});
+  }
+  addRows(grid, "ELEMENTS", [&](size_t row, size_t width) {
+    const Track& track = series.tracks()[tracks[row]];
+    if (!track.isArray) return;
+    wide_.clear();
+    for (uint32_t i = 0; i < track.elements; ++i) {
+      wide_.push_back(series.delta(tracks[row], i).value_or(Wide()));
+    }
+    appendChanges(sink_.text, wide_, width);
+  });
+  for (const Capture& capture : series.captures()) addFindings(capture, printable(capture.source) + ": ");
+}
+
+void Table::trend(const Series& series) {
+  std::string& out = sink_.text;
+  const std::vector<size_t> tracks = series.tracksInOrder();
+  out += std::string(kindTitle(series.kind())) + ", " + counted(series.points(), "capture") + ", ";
+  out += std::to_string(tracks.size()) + (series.showsUnchanged() ? " shown" : " changed");
+  std::vector<Grid::Column> columns = {{"KEY", true},   {"NAME", false},    {"FIRST", true},  {"LAST", true},
+                                       {"LEAST", true}, {"GREATEST", true}, {"CHANGE", true}, {"%", true}};
+  const Over* const over = series.over();
+  uint64_t span = 0;
+  if (over != nullptr) {
+    span = over->values.back() - over->values.front();
+    out += ", over " + printable(over->name) + " " + std::to_string(over->values.front()) + " to " +
+           std::to_string(over->values.back());
+    columns.push_back({"PER UNIT", true});
+  }
+  out += '\n';
+  Grid grid(columns);
+  for (const size_t track : tracks) {
+    std::optional<Wide> least;
+    std::optional<Wide> greatest;
+    for (size_t point = 0; point < series.points(); ++point) {
+      const auto value = series.sum(track, point);
+      if (!value) continue;
+      least = std::min(least.value_or(*value), *value);
+      greatest = std::max(greatest.value_or(*value), *value);
+    }
+    const auto change = series.change(track);
+    std::vector<std::string> row = {std::to_string(series.tracks()[track].key),
+                                    shown(series.tracks()[track].name),
+                                    decimal(series.sum(track, 0)),
+                                    decimal(series.sum(track, series.points() - 1)),
+                                    decimal(least),
+                                    decimal(greatest),
+                                    decimal(change, true),
+                                    percent(series.percent(track))};
+    if (over != nullptr) {
+      row.push_back(change && span != 0 ? fixed(static_cast<double>(*change) / static_cast<double>(span), 3)
+                                        : "-");
+    }
+    grid.add(std::move(row));
+  }
+  addRows(grid, "TREND", [&](size_t row, size_t width) {
+    std::vector<std::optional<double>> values;
+    for (size_t point = 0; point < series.points(); ++point) {
+      const auto value = series.sum(tracks[row], point);
+      values.push_back(value ? std::optional(static_cast<double>(*value)) : std::nullopt);
+    }
+    appendSparkline(sink_.text, values, width);
+  });
+  for (const Capture& capture : series.captures()) addFindings(capture, printable(capture.source) + ": ");
+}
+
+/// A series' rows with a picture behind each, made by `addPicture(row, width)`.
+template <class AddPicture>
+void Table::addRows(Grid& grid, std::string_view pictures, AddPicture addPicture) {
   constexpr size_t kName = 1;
   std::string& out = sink_.text;
-  std::vector<size_t> changed;
-  for (const size_t track : series.tracksInOrder()) {
-    if (series.changes(track)) changed.push_back(track);
-  }
-  out += printable(series.captures().front().source) + " -> " + printable(series.captures().back().source) +
-         ": " + std::to_string(changed.size()) + " changed\n";
-  Grid grid({{"KEY", true}, {"NAME", false}, {"OLD", true}, {"NEW", true}, {"DELTA", true}});
-  for (const size_t track : changed) {
-    const auto before = series.sum(track, 0);
-    const auto after = series.sum(track, 1);
-    std::optional<Wide> delta;
-    if (before && after) delta = *after - *before;
-    grid.add({std::to_string(series.tracks()[track].key), shown(series.tracks()[track].name), decimal(before),
-              decimal(after), decimal(delta, true)});
-  }
   if (options_.isTerminal) grid.fit(kName, kLeastName, options_.width, kGap + kLeastBars);
   const size_t used = grid.width() + kGap;
-  for (size_t row = 0; row < changed.size(); ++row) {
+  for (size_t row = 0; row < grid.rows(); ++row) {
     if (row == 0) {
       grid.appendHead(out);
-      out.append(kGap, ' ').append("ELEMENTS\n");
+      out.append(kGap, ' ').append(pictures).append("\n");
     }
     grid.appendRow(out, row);
-    if (const Track& track = series.tracks()[changed[row]]; track.isArray) {
-      wide_.clear();
-      for (uint32_t i = 0; i < track.elements; ++i) {
-        wide_.push_back(series.delta(changed[row], i).value_or(Wide()).magnitude());
-      }
-      out.append(kGap, ' ');
-      appendBars<Wide>(out, wide_, std::max(options_.width, used + kLeastBars) - used);
-    }
+    const size_t bare = out.size();
+    out.append(kGap, ' ');
+    const size_t begun = out.size();
+    addPicture(row, std::max(options_.width, used + kLeastBars) - used);
+    if (out.size() == begun) out.resize(bare);
     out += '\n';
     sink_.offer();
   }
-  for (const Capture& capture : series.captures()) addFindings(capture, printable(capture.source) + ": ");
 }
 
 void Table::listing(const Listing& listing) {

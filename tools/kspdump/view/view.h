@@ -77,6 +77,8 @@ struct ViewOptions {
   bool isTerminal = false;
   /// Whether each element of an array has a row of its own.
   bool expands = false;
+  /// Whether captures are snapshots: their intervals are points of a series.
+  bool isSnapshot = false;
 };
 
 /// What a form can be asked to show.

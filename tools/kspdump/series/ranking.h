@@ -1,0 +1,32 @@
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <string>
+#include <vector>
+
+namespace kspdump {
+
+/// Which tracks of a series are shown, and in which order.
+struct Ranking {
+  enum class Order {
+    kKey,
+    kName,
+    kChange,   ///< the greatest first, whatever its sign
+    kPercent,  ///< likewise; those that began with nothing behind them
+  };
+
+  Order order = Order::kKey;
+  /// The most that are shown; 0 for all.
+  size_t most = 0;
+  /// Whether those that do not change are shown too.
+  bool withUnchanged = false;
+};
+
+/// A single-valued statistic that a series goes over, with its value at each point.
+struct Over {
+  std::string name;
+  std::vector<uint64_t> values;
+};
+
+}  // namespace kspdump
