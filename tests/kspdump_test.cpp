@@ -370,7 +370,7 @@ TEST_F(Kspdump, TrendsGoOverCapturesOrAStatistic) {
   EXPECT_EQ(shell("LC_ALL=C $KSPDUMP trend stats --over powerOnHours --match hostWrites a b c").out,
             "statistics, 3 captures, 1 changed, over powerOnHours 10 to 30\n"
             "KEY  NAME        FIRST  LAST  LEAST  GREATEST  CHANGE       %  PER UNIT  TREND\n"
-            "  4  hostWrites     40   100     40       100     +60  +150.0     3.000  -*@\n");
+            "  4  hostWrites     40   100     40       100     +60  +150.0     3.000  =*@\n");
   EXPECT_EQ(run("trend stats --format csv --key 298 --key 900 a b").out,
             "source,perHostReads_0,perHostReads_1,Stat_900\na,1,2,\nb,,,7\n");
   EXPECT_EQ(run("trend stats a").status, 2);
@@ -391,14 +391,18 @@ TEST_F(Kspdump, SnapshotsAreSeriesInTheOrderOfTime) {
   EXPECT_EQ(shell("LC_ALL=C COLUMNS=60 $KSPDUMP snapshot --format chart --match T --match '[HN]W' ring").out,
             "ring: snapshot, 4 intervals\n"
             "NAME   LEAST   MEAN  GREATEST\n"
-            "T         10  25.00        40  .=*@\n"
+            "T         10  25.00        40  :=*@\n"
             "HW         0   2.50         4  _@@=\n"
-            "NW         0   3.50         8  _=.@\n"
-            "NW/HW   0.50   1.40      4.00   ..@\n");
-  std::istringstream lines(shell("COLUMNS=80 $KSPDUMP snapshot --format chart " KSP_EXAMPLE_CAPTURES "/day.snapshot").out);
+            "NW         0   3.50         8  _=:@\n"
+            "NW/HW   0.50   1.40      4.00   :.@\n");
+  std::istringstream lines(
+      shell("COLUMNS=80 $KSPDUMP snapshot --format chart " KSP_EXAMPLE_CAPTURES "/day.snapshot").out);
   size_t count = 0;
   for (std::string line; std::getline(lines, line); ++count) {
-    EXPECT_LE(line.size() - static_cast<size_t>(std::count_if(line.begin(), line.end(), [](char c) { return (c & 0xC0) == 0x80; })), 80u) << line;
+    EXPECT_LE(line.size() - static_cast<size_t>(std::count_if(line.begin(), line.end(),
+                                                              [](char c) { return (c & 0xC0) == 0x80; })),
+              80u)
+        << line;
   }
   EXPECT_GT(count, 50u);
 }

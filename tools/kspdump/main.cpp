@@ -254,7 +254,8 @@ std::string help(const Command* command) {
         addLine("", std::string("(default: ") + row.usual + ")");
         continue;
       }
-      addLine(left, row.help + (":" + formNames(command->subject)));
+      addLine(left, row.help + std::string(":"));
+      addLine("", formNames(command->subject).substr(1));
       addLine("", "(default: " + defaultForm(command->subject) + ")");
     }
     addLine("--help, --version", "");

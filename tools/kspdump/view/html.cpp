@@ -300,7 +300,6 @@ class Html : public View {
     const std::vector<Capture>& captures = series.captures();
     beginSection(about, captures.front().source + between + captures.back().source, captures);
     for (const size_t track : series.tracksInOrder()) {
-      if (!series.changes(track)) continue;
       points_.clear();
       for (size_t point = 0; point < series.points(); ++point) points_.push_back(series.values(track, point));
       const Track& of = series.tracks()[track];
