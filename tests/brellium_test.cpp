@@ -55,6 +55,7 @@ class Daemon {
       execl(KSP_BRELLIUM, "brellium", "--ignored", nullptr);
       _exit(127);
     }
+    if (process_ < 0) std::abort();  // a signal to process -1 would reach every other
   }
 
   ~Daemon() {
@@ -93,7 +94,10 @@ class Daemon {
   }
 
   void type(char key) const { EXPECT_EQ(write(terminal_, &key, 1), 1); }
-  void signal(int number) const { kill(process_, number); }
+  void signal(int number) const {
+    ASSERT_GT(process_, 0);
+    kill(process_, number);
+  }
 
   /// The exit status, or the negative number of the signal that ended it.
   int exitStatus() {
