@@ -30,7 +30,7 @@ uint64_t roundSig(uint64_t value, uint64_t digits) {
   if (present <= digits) return value;
   const uint64_t dropped = present - digits;
   if (dropped >= kPowersOfTen.size()) return 0;
-  const uint64_t power = kPowersOfTen[dropped];
+  const uint64_t power = kPowersOfTen[static_cast<size_t>(dropped)];
   const uint64_t rounded = value / power + (value % power >= power / 2 ? 1 : 0);
   constexpr uint64_t kLargest = std::numeric_limits<uint64_t>::max();
   return rounded > kLargest / power ? kLargest : rounded * power;

@@ -40,7 +40,8 @@ std::optional<uint32_t> SnapshotHeader::keyOffset() const {
 const char* snapshotHeaderFault(const void* header, uint64_t size) {
   if (size < SnapshotHeader::kFixedBytes) return "is shorter than its fixed 36 bytes";
   const SnapshotHeader reader(header);
-  if (reader.hasTitle() && std::memchr(reader.title(), '\0', size - SnapshotHeader::kFixedBytes) == nullptr) {
+  if (reader.hasTitle() &&
+      std::memchr(reader.title(), '\0', static_cast<size_t>(size) - SnapshotHeader::kFixedBytes) == nullptr) {
     return "has a title without an end";
   }
   const uint64_t table = uint64_t{reader.tableOffset()} + SnapshotHeader::kTableFixedBytes;

@@ -31,7 +31,7 @@ inline uint64_t plainNumber(const unsigned char* bytes, size_t width) {
 
 /// Returns the key table's row of `key`, or null.
 template <const auto& rows>
-auto plainRow(uint64_t key) -> decltype(std::data(rows)) {
+auto plainRow(size_t key) -> decltype(std::data(rows)) {
   static const auto kByKey = [] {
     std::vector<decltype(std::data(rows))> byKey(std::numeric_limits<uint16_t>::max() + 1);
     for (const auto& row : rows) byKey[row.key] = &row;
@@ -54,8 +54,8 @@ template <class Append>
 uint32_t plainStatistics(const unsigned char* stream, uint32_t length, bool byNumber, Append append) {
   uint32_t total = 0;
   for (size_t left = length / 8; left > 0;) {
-    const uint64_t key = plainNumber(stream, 4);
-    const uint64_t count = plainNumber(stream + 4, 4);
+    const auto key = static_cast<size_t>(plainNumber(stream, 4));
+    const auto count = static_cast<size_t>(plainNumber(stream + 4, 4));
     stream += 8;
     --left;
     if (count == 0) continue;
@@ -111,8 +111,8 @@ inline constexpr auto plainLegacy = [](KSPParseContext& context, const unsigned 
   context.parseMarker = 0xFFFFFFFF;
   if (length < 8) return 0;
   for (size_t left = length / 8; left > 0;) {
-    const uint64_t key = plainNumber(stream, 4);
-    const uint64_t count = plainNumber(stream + 4, 4);
+    const auto key = static_cast<size_t>(plainNumber(stream, 4));
+    const auto count = static_cast<size_t>(plainNumber(stream + 4, 4));
     stream += 8;
     --left;
     if (key > 0x30000000 || count > left) {
@@ -133,7 +133,7 @@ inline constexpr auto plainLegacy = [](KSPParseContext& context, const unsigned 
 inline constexpr auto plainMedia = [](auto&, const unsigned char* buffer, uint32_t length, auto append) {
   uint32_t total = 0;
   while (length >= 4) {
-    const uint64_t key = plainNumber(buffer, 2);
+    const auto key = static_cast<size_t>(plainNumber(buffer, 2));
     const auto size = static_cast<uint32_t>(plainNumber(buffer + 2, 2));
     buffer += 4;
     length -= 4;

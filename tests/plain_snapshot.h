@@ -34,12 +34,12 @@ inline int plainReport(const void* records, uint64_t length, char* out, uint64_t
                                         {" WO=%4u", "/%4u", 2},
                                         {" WL=%7u", "/%7u", 3},
                                         {" WM=%5u", "/%5u", 4}};
-  uint64_t left = *size;
+  auto left = static_cast<size_t>(*size);
   const auto piece = [&](const char* format, auto... values) {
     const int written = std::snprintf(out, left, format, values...);
-    if (written < 0 || static_cast<uint64_t>(written) >= left) return false;
+    if (written < 0 || static_cast<size_t>(written) >= left) return false;
     out += written;
-    left -= static_cast<uint64_t>(written);
+    left -= static_cast<size_t>(written);
     return true;
   };
   if (!piece("%s", kPlainLegend)) return 0;

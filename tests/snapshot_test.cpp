@@ -69,7 +69,7 @@ struct Outcome {
 
 template <class Renderer>
 Outcome render(uint64_t capacity, uint32_t cursor, Renderer renderer) {
-  Outcome outcome{0, capacity, cursor, 0, std::string(capacity + 64, kUntouched)};
+  Outcome outcome{0, capacity, cursor, 0, std::string(static_cast<size_t>(capacity) + 64, kUntouched)};
   const uint64_t before = allocations;
   outcome.result = renderer(outcome.buffer.data(), &outcome.size, &outcome.cursor);
   outcome.allocated = allocations - before;
@@ -108,7 +108,7 @@ Outcome page(const std::string& header, const std::string& records, uint64_t cap
   EXPECT_EQ(outcome.cursor, expected.cursor);
   EXPECT_EQ(outcome.size, expected.text.size() + 1);
   EXPECT_EQ(outcome.text(), capacity == 0 ? outcome.buffer : expected.text);
-  EXPECT_EQ(outcome.buffer.find_first_not_of(kUntouched, capacity), std::string::npos);
+  EXPECT_EQ(outcome.buffer.find_first_not_of(kUntouched, static_cast<size_t>(capacity)), std::string::npos);
   return outcome;
 }
 

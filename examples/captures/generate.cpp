@@ -66,7 +66,7 @@ class Statistic {
     for (uint64_t i = 0; i < count; ++i) {
       const uint64_t away = i > top ? i - top : top - i;
       const uint64_t rise = away < reach ? reach - away : 0;
-      values_[i] = height * rise * rise / (reach * reach);
+      values_[static_cast<size_t>(i)] = height * rise * rise / (reach * reach);
     }
   }
 

@@ -23,7 +23,8 @@ class Elements : public std::ranges::view_base {
     using reference = uint64_t;
 
     Iterator() = default;
-    Iterator(const unsigned char* at, uint32_t width) : at_(at), width_(width) {}
+    Iterator(const unsigned char* at, uint32_t width)
+        : at_(at), width_(static_cast<difference_type>(width)) {}
 
     uint64_t operator*() const { return loadLittleEndian(at_, static_cast<size_t>(width_)); }
     uint64_t operator[](difference_type steps) const { return *(*this + steps); }
@@ -64,7 +65,7 @@ class Elements : public std::ranges::view_base {
       : source_(source), width_(width), count_(count) {}
 
   [[nodiscard]] Iterator begin() const { return {source_, width_}; }
-  [[nodiscard]] Iterator end() const { return begin() + count_; }
+  [[nodiscard]] Iterator end() const { return begin() + static_cast<std::ptrdiff_t>(count_); }
   /// `index` is below `size()`.
   [[nodiscard]] uint64_t operator[](uint32_t index) const {
     return loadLittleEndian(source_ + size_t{index} * width_, width_);

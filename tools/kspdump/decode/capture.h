@@ -34,7 +34,7 @@ class Values {
   [[nodiscard]] bool empty() const { return count_ == 0; }
 
   [[nodiscard]] uint64_t operator[](uint32_t i) const {
-    return ksp::loadLittleEndian(first_ + std::ptrdiff_t{stride_} * i, size_t{width_});
+    return ksp::loadLittleEndian(address(i), size_t{width_});
   }
 
   /// Hands the values from `begin` to `end` to `take`, one after another.
@@ -56,15 +56,13 @@ class Values {
   /// Appends the values one behind the other, each in `width` bytes.
   void copyTo(std::vector<unsigned char>& bytes) const {
     for (uint32_t i = 0; i < count_; ++i) {
-      const unsigned char* const at = first_ + std::ptrdiff_t{stride_} * i;
+      const unsigned char* const at = address(i);
       bytes.insert(bytes.end(), at, at + width_);
     }
   }
 
   /// One of the values alone.
-  [[nodiscard]] Values only(uint32_t i) const {
-    return {first_ + std::ptrdiff_t{stride_} * i, 1, width_, stride_};
-  }
+  [[nodiscard]] Values only(uint32_t i) const { return {address(i), 1, width_, stride_}; }
 
   /// The values of the same field in a record that lies so far behind.
   [[nodiscard]] Values movedBy(std::ptrdiff_t bytes) const {
@@ -72,6 +70,10 @@ class Values {
   }
 
  private:
+  [[nodiscard]] const unsigned char* address(uint32_t i) const {
+    return first_ + std::ptrdiff_t{stride_} * static_cast<std::ptrdiff_t>(i);
+  }
+
   const unsigned char* first_ = nullptr;
   uint32_t count_ = 0;
   int32_t stride_ = 0;

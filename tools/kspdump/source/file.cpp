@@ -72,7 +72,7 @@ Rejoined::Rejoined(Buffer head, std::unique_ptr<Stream> rest)
 
 size_t Rejoined::read(unsigned char* out, size_t size) {
   if (at_ < head_.size()) {
-    const size_t count = std::min<size_t>(size, head_.size() - at_);
+    const size_t count = std::min(size, static_cast<size_t>(head_.size() - at_));
     std::memcpy(out, head_.data() + at_, count);
     at_ += count;
     return count;

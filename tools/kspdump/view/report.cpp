@@ -35,17 +35,17 @@ class Report : public View {
 
  private:
   void addFixed(Bytes records) {
-    constexpr uint64_t kChunk = 4096 * ksp::kRecordBytes;
-    constexpr uint64_t kLongestLine = 1024;
-    const uint64_t usable = records.size() / ksp::kRecordBytes * ksp::kRecordBytes;
+    constexpr size_t kChunk = size_t{4096} * ksp::kRecordBytes;
+    constexpr size_t kLongestLine = 1024;
+    const size_t usable = records.size() / ksp::kRecordBytes * ksp::kRecordBytes;
     std::vector<char> text(ksp::kLegend.size() + std::min(kChunk, usable) / ksp::kRecordBytes * kLongestLine +
                            2);
-    uint64_t done = 0;
+    size_t done = 0;
     do {
-      const uint64_t chunk = std::min(kChunk, usable - done);
+      const size_t chunk = std::min(kChunk, usable - done);
       uint64_t size = text.size();
       KSPParseSnapshotBuffer(records.data() + done, chunk, text.data(), &size);
-      std::string_view part(text.data(), size);
+      std::string_view part(text.data(), static_cast<size_t>(size));
       // The legend goes before the first record and the empty line behind the last.
       if (done != 0) part.remove_prefix(ksp::kLegend.size());
       done += chunk;
@@ -65,7 +65,7 @@ class Report : public View {
       done = KSPParseSnapshotBufferWithInplaceParser(capture.bytes.data(), capture.bytes.size(), page.data(),
                                                      &size, capture.header.data(), &cursor);
       const bool isEmpty = size == 1;
-      addLines({page.data(), size - 1});
+      addLines({page.data(), static_cast<size_t>(size) - 1});
       if (done != 0) break;
       // The line that did not fit opens the next page, or gets a larger one where it had this to itself.
       if (!isEmpty) {
