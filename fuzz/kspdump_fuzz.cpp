@@ -39,7 +39,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   }
   for (const Form* form : formsFor(isSnapshot ? Subject::kSnapshot : Subject::kStatistics)) {
     Sink sink;
-    const auto view = form->make({}, sink);
+    const auto view = form->make({.isSnapshot = isSnapshot}, sink);
     view->head();
     show(decoding, capture, *view);
     view->tail();
@@ -55,6 +55,11 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     Sink sink;
     form->make({}, sink)->difference(same);
     if (form->name == "table" && sink.text.find(": 0 changed\n") == std::string::npos) std::abort();
+  }
+  for (const Form* form : formsFor(Subject::kTrend)) {
+    Sink sink;
+    form->make({}, sink)->trend(same);
+    if (form->name == "json" && !nlohmann::json::parse(sink.text)["series"].empty()) std::abort();
   }
   return 0;
 }

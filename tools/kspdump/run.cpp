@@ -246,7 +246,7 @@ class Row {
   Series& finish() {
     const size_t points = series_.captures().size();
     if (points < 2)
-      throw UsageError("a trend takes two captures or more, and there is " + counted(points, "capture"));
+      throw UsageError("a trend takes two captures or more, but got " + counted(points, "capture"));
     series_.rank(options_.ranking);
     if (!options_.over.empty()) {
       over_.name = options_.over;
