@@ -127,7 +127,8 @@ TEST(Page, ADifferenceCarriesBothSidesExactly) {
                                            {{7, "<s>", {2, kMost - 1}}, {10, "same", {4}}}}));
   const Shown shown(sink.text);
   ASSERT_EQ(shown.data.size(), 3u);
-  EXPECT_EQ(shown.data[0], json::parse(R"({"view":"difference","kind":"stats","points":["<0>","<1>"]})"));
+  EXPECT_EQ(shown.data[0],
+            json::parse(R"({"view":"difference","kind":"stats","points":["<0>","<1>"],"over":null})"));
   EXPECT_EQ(shown.data[1], json::parse(R"({"key":7,"name":"<s>","values":
       [[1,"18446744073709551615"],[2,"18446744073709551614"]]})"));
   EXPECT_EQ(shown.data[2], json::parse(R"({"key":9,"name":"gone","values":[3,null]})"));

@@ -259,9 +259,25 @@ class Html : public View {
         appendSafeJson(json, captures[i].source);
       }
     }
-    json += "]}";
+    json += "],\"over\":";
+    if (over_ != nullptr) {
+      json += "{\"name\":";
+      appendSafeJson(json, over_->name);
+      json += ",\"values\":[";
+      for (size_t i = 0; i < over_->values.size(); ++i) {
+        if (i != 0) json += ',';
+        appendValue(json, over_->values[i]);
+      }
+      json += "]}";
+    } else {
+      json += "null";
+    }
+    json += "}";
     part("table", {{"about", json, kMarkup}});
-    for (const Column& column : columnsOf(about)) {
+    columns_ = columnsOf(about);
+    const std::string unit = over_ != nullptr ? "Per " + over_->name : "";
+    if (over_ != nullptr) columns_.insert(columns_.end() - 1, {unit, "number spare"});
+    for (const Column& column : columns_) {
       part("column", {{"class", column.classes}, {"title", column.title}});
     }
     part("rows");
@@ -298,6 +314,7 @@ class Html : public View {
 
   void showChanges(About about, const Series& series, const char* between) {
     const std::vector<Capture>& captures = series.captures();
+    over_ = series.over();
     beginSection(about, captures.front().source + between + captures.back().source, captures);
     for (const size_t track : series.tracksInOrder()) {
       points_.clear();
@@ -340,7 +357,7 @@ class Html : public View {
     json += ",\"name\":";
     appendSafeJson(json, name);
     appendValues(json, isArray);
-    appendRow(about, isArray || isSeries, std::to_string(key), name, numbers,
+    appendRow(isArray || isSeries, std::to_string(key), name, numbers,
               isArray ? std::to_string(elements) : "", pictureOf(about, isArray, elements), json);
   }
 
@@ -368,14 +385,14 @@ class Html : public View {
     for (const double number : {drawn_.front(), drawn_.back(), least, *overall, greatest}) {
       numbers.push_back(std::isnan(number) ? "" : rounded(number, kDecimals));
     }
-    appendRow(About::kSnapshot, true, "", ratio.name, numbers, "", drawLine(drawn_), json);
+    appendRow(true, "", ratio.name, numbers, "", drawLine(drawn_), json);
   }
 
-  void appendRow(About about, bool opens, std::string_view key, std::string_view name,
+  void appendRow(bool opens, std::string_view key, std::string_view name,
                  const std::vector<std::string>& numbers, std::string_view elements, std::string_view picture,
                  std::string_view json) {
     part("row", {{"class", opens ? "opens" : ""}, {"key", key}, {"name", name}});
-    auto column = columnsOf(about).begin() + 2;
+    auto column = columns_.begin() + 2;
     for (const std::string& number : numbers) {
       part("number", {{"class", (column++)->classes}, {"number", number, kMarkup}});
     }
@@ -427,8 +444,10 @@ class Html : public View {
       ++present;
     }
     if (about == About::kTrend) {
-      return {decimal(first),    decimal(last),         decimal(least),
-              decimal(greatest), decimal(change, true), percent(first, last)};
+      std::vector<std::string> numbers = {decimal(first),    decimal(last),         decimal(least),
+                                          decimal(greatest), decimal(change, true), percent(first, last)};
+      if (over_ != nullptr) numbers.push_back(perUnit(change));
+      return numbers;
     }
     const double mean = static_cast<double>(all) / std::max(present, 1U);
     return {decimal(first), decimal(last), decimal(least),
@@ -436,6 +455,15 @@ class Html : public View {
                           : mean < 1000 ? 1
                                         : 0),
             decimal(greatest)};
+  }
+
+  /// A change by what the captures went over meanwhile.
+  [[nodiscard]] std::string perUnit(const std::optional<Wide>& change) const {
+    constexpr double kLarge = 100;
+    const double units = static_cast<double>(Wide(over_->values.back()) - Wide(over_->values.front()));
+    if (!change || units == 0) return "";
+    const double each = static_cast<double>(*change) / units;
+    return rounded(each, std::abs(each) < kLarge ? 3 : 0);
   }
 
   std::string pictureOf(About about, bool isArray, uint32_t elements) {
@@ -460,6 +488,9 @@ class Html : public View {
 
   bool isSnapshot_ = false;
   Series series_;
+  std::vector<Column> columns_;
+  /// What the captures of a trend are ordered by; null for their order.
+  const Over* over_ = nullptr;
   // Of the row that is made; kept for the room they have.
   std::vector<Values> points_;
   std::vector<std::optional<Wide>> totals_;

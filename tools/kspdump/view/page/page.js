@@ -137,14 +137,16 @@ function histogram(place, readout, sets, label) {
   }
   const slot = plot.width / bins, gap = slot > 6 ? 0.12 : 0;
   const bar = slot * (1 - 2 * gap) / sets.length;
+  // All bars have their counts above them, or none.
+  const isCounted = sets.length === 1 && slot > 7 * Math.max(...sets[0].values.map(value => String(value).length));
   sets.forEach((set, s) => set.values.forEach((value, bin) => {
     const number = asNumber(value);
     if (Number.isNaN(number)) return;
     const top = Math.min(y(number), y(0)), left = x(bin) + slot * gap + s * bar;
     picture.append(draw('rect', {class: set.class ?? (number < 0 ? 'down' : 'up'), x: left, y: top,
                                  width: bar, height: Math.abs(y(number) - y(0))}));
-    if (sets.length === 1 && slot > 7 * String(value).length) {
-      picture.append(draw('text', {class: 'counts', x: left + bar / 2, y: number < 0 ? top - 4 : top - 4,
+    if (isCounted) {
+      picture.append(draw('text', {class: 'counts', x: left + bar / 2, y: top - 4,
                                    'text-anchor': 'middle'}, String(value)));
     }
   }));
