@@ -43,23 +43,23 @@ enum : unsigned {
 
 struct Command {
   std::string_view name;
-  unsigned bit;
   const char* arguments;
   const char* summary;
+  unsigned bit;
   Subject subject;
 };
 
 constexpr Command kCommands[] = {
-    {"stats", kStats, "SOURCE...", "Decode statistics streams", Subject::kStatistics},
-    {"summary", kSummary, "SOURCE...", "Decode the summary block of statistics streams",
+    {"stats", "SOURCE...", "Decode statistics streams", kStats, Subject::kStatistics},
+    {"summary", "SOURCE...", "Decode the summary block of statistics streams", kSummary,
      Subject::kStatistics},
-    {"media", kMedia, "SOURCE...", "Decode media statistics streams", Subject::kStatistics},
-    {"snapshot", kSnapshot, "SOURCE", "Show a snapshot: the fixed layout, or a header's", Subject::kSnapshot},
-    {"diff", kDiff, "stats|summary|media OLD NEW", "Show what changed between two captures",
+    {"media", "SOURCE...", "Decode media statistics streams", kMedia, Subject::kStatistics},
+    {"snapshot", "SOURCE", "Show a snapshot: the fixed layout, or a header's", kSnapshot, Subject::kSnapshot},
+    {"diff", "stats|summary|media OLD NEW", "Show what changed between two captures", kDiff,
      Subject::kDifference},
-    {"trend", kTrend, "stats|summary|media SOURCE...", "Show how values went over captures", Subject::kTrend},
-    {"identify", kIdentify, "SOURCE...", "Tell which kind of capture each is", Subject::kListing},
-    {"keys", kKeys, "stats|media [GLOB]", "List the keys that have a name", Subject::kListing},
+    {"trend", "stats|summary|media SOURCE...", "Show how values went over captures", kTrend, Subject::kTrend},
+    {"identify", "SOURCE...", "Tell which kind of capture each is", kIdentify, Subject::kListing},
+    {"keys", "stats|media [GLOB]", "List the keys that have a name", kKeys, Subject::kListing},
 };
 
 /// What the words of a command line come to before they are made into options of the program.

@@ -34,7 +34,7 @@ class Wide {
   constexpr bool operator==(const Wide&) const = default;
   constexpr std::strong_ordering operator<=>(const Wide& other) const {
     const auto high = static_cast<int64_t>(high_) <=> static_cast<int64_t>(other.high_);
-    return high != 0 ? high : low_ <=> other.low_;
+    return std::is_neq(high) ? high : low_ <=> other.low_;
   }
 
   [[nodiscard]] constexpr bool isNegative() const { return static_cast<int64_t>(high_) < 0; }
