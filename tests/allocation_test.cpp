@@ -80,18 +80,6 @@ class Allocation : public testing::Test {
   }
 };
 
-TEST_F(Allocation, TwoForEachEntry) {
-  GenericContext generic;
-  LegacyContext legacy;
-  GenericContext media;
-  kStatistics.into(KSPFTLParseBufferToCxt, generic.get());
-  EXPECT_EQ(calls, 2 * kEntries);
-  kStatistics.into(KSPParseBufferToCxt, legacy.get());
-  EXPECT_EQ(calls, 4 * kEntries);
-  kMedia.into(KSPMSPParseBufferToCxt, media.get());
-  EXPECT_EQ(calls, 6 * kEntries);
-}
-
 TEST_F(Allocation, GenericNodesAreZeroBehindTheirText) {
   GenericContext context;
   kStatistics.into(KSPFTLParseBufferToCxt, context.get());

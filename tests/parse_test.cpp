@@ -60,10 +60,10 @@ std::string run(const std::string& parser, const std::string& kind, const std::s
     return outcome<GenericContext>(stream, KSPFTLParseStatKeyBufferToCxt, lost);
   if (parser.starts_with("legacy")) return outcome<LegacyContext>(stream, KSPParseBufferToCxt, lost);
   if (parser.starts_with("media")) return outcome<GenericContext>(stream, KSPMSPParseBufferToCxt, lost);
-  const auto walk = [&](const void*, const void* bytes, uint32_t length) {
+  const auto walk = [&](const void* bytes, uint32_t length) {
     return isMedia ? walked(MediaRecords(bytes, length)) : walked(StatisticsRecords(bytes, length));
   };
-  return parser == "walk" ? stream.into(walk, static_cast<void*>(nullptr)) : "no parser has this name";
+  return parser == "walk" ? stream.into(walk) : "no parser has this name";
 }
 
 TEST(Parse, Cases) {
@@ -115,10 +115,10 @@ TEST(Parse, NullStreams) {
 
 template <class Owner, class Parse, class Plain>
 void expectAgreement(const Stream& stream, Parse parse, Plain plain) {
-  const auto compare = [=](void*, const unsigned char* bytes, uint32_t length) {
+  const auto compare = [=](const unsigned char* bytes, uint32_t length) {
     return agrees<Owner>(parse, plain, bytes, length);
   };
-  EXPECT_TRUE(stream.into(compare, static_cast<void*>(nullptr)));
+  EXPECT_TRUE(stream.into(compare));
 }
 
 // Streams of every key, then of keys, counts and ends as they fall.

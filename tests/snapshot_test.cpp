@@ -58,49 +58,42 @@ std::string makeHeader(uint32_t recordSize, uint32_t recordCount) {
 }
 
 struct Outcome {
-  int result = 0;
   uint64_t size = 0;
   uint32_t cursor = 0;
+  /// All of it, with some bytes behind its capacity.
+  std::string buffer = std::string(static_cast<size_t>(size) + 64, kUntouched);
+  int result = 0;
   uint64_t allocated = 0;
-  std::string buffer;  // all of it, with some bytes behind its capacity
+
+  template <class Renderer, class... Arguments>
+  void render(Renderer renderer, const std::string& records, Arguments... arguments) {
+    const uint64_t before = allocations;
+    result = renderer(records.data(), records.size(), buffer.data(), &size, arguments...);
+    allocated = allocations - before;
+  }
 
   std::string text() const { return buffer.substr(0, buffer.find('\0')); }
 };
 
-template <class Renderer>
-Outcome render(uint64_t capacity, uint32_t cursor, Renderer renderer) {
-  Outcome outcome{0, capacity, cursor, 0, std::string(static_cast<size_t>(capacity) + 64, kUntouched)};
-  const uint64_t before = allocations;
-  outcome.result = renderer(outcome.buffer.data(), &outcome.size, &outcome.cursor);
-  outcome.allocated = allocations - before;
-  return outcome;
-}
-
 // Renders a report that is to be the plain one, bytes behind its end included.
 Outcome report(const std::string& records, uint64_t capacity) {
-  const auto by = [&](auto renderer) {
-    return render(capacity, 0, [&](char* out, uint64_t* size, uint32_t* /*cursor*/) {
-      return renderer(records.data(), records.size(), out, size);
-    });
-  };
-  Outcome outcome = by(KSPParseSnapshotBuffer);
-  const Outcome expected = by(plainReport);
+  Outcome outcome{capacity};
+  Outcome expected{capacity};
+  outcome.render(KSPParseSnapshotBuffer, records);
+  expected.render(plainReport, records);
   EXPECT_EQ(outcome.result, expected.result) << capacity;
   EXPECT_EQ(outcome.size, expected.size) << capacity;
   EXPECT_EQ(outcome.buffer, expected.buffer) << capacity;
   return outcome;
 }
 
-const unsigned char* bytesOf(const std::string& text) {
-  return reinterpret_cast<const unsigned char*>(text.data());
-}
-
 // Renders a page that is to be the plain one; behind its capacity nothing is written.
 Outcome page(const std::string& header, const std::string& records, uint64_t capacity, uint32_t cursor = 0) {
-  Outcome outcome = render(capacity, cursor, [&](char* out, uint64_t* size, uint32_t* next) {
-    return KSPParseSnapshotBufferWithInplaceParser(records.data(), records.size(), out, size, header.data(),
-                                                   next);
-  });
+  Outcome outcome{capacity, cursor};
+  outcome.render(KSPParseSnapshotBufferWithInplaceParser, records, header.data(), &outcome.cursor);
+  const auto bytesOf = [](const std::string& text) {
+    return reinterpret_cast<const unsigned char*>(text.data());
+  };
   const PlainPage expected =
       plainPage(bytesOf(records), records.size(), capacity, bytesOf(header), cursor, kCaptureLine);
   SCOPED_TRACE(testing::Message() << capacity << " bytes from record " << cursor);
@@ -157,11 +150,9 @@ TEST(Snapshot, PageShowsTheLocalTimeOfItsRendering) {
                                               {"BBB+11", 999, "2026-02-28 11:30:05.000"}}) {
     setenv("TZ", zone, 1);
     microseconds = fraction;
-    std::string out(200, kUntouched);
-    uint64_t size = out.size();
-    uint32_t cursor = 0;
-    KSPParseSnapshotBufferWithInplaceParser(records.data(), 8, out.data(), &size, header.data(), &cursor);
-    EXPECT_EQ(out.substr(0, kCaptureLine.size()), std::string("Captured at: ") + local + "\n");
+    Outcome outcome{200};
+    outcome.render(KSPParseSnapshotBufferWithInplaceParser, records, header.data(), &outcome.cursor);
+    EXPECT_TRUE(outcome.text().starts_with(std::string("Captured at: ") + local + "\n"));
   }
   setenv("TZ", "UTC0", 1);
   microseconds = 7999;
@@ -207,11 +198,10 @@ TEST(Snapshot, WalkEndsWithTheRecordsWhateverTheHeaderClaims) {
 }
 
 TEST(Snapshot, PageWithoutHeaderLeavesEverythingUntouched) {
-  uint64_t size = 3;
-  uint32_t cursor = 7;
-  EXPECT_EQ(KSPParseSnapshotBufferWithInplaceParser("", 0, nullptr, &size, nullptr, &cursor), 0);
-  EXPECT_EQ(size, 3U);
-  EXPECT_EQ(cursor, 7U);
+  Outcome outcome{3, 7};
+  outcome.render(KSPParseSnapshotBufferWithInplaceParser, "", nullptr, &outcome.cursor);
+  EXPECT_TRUE(outcome.result == 0 && outcome.size == 3 && outcome.cursor == 7);
+  EXPECT_EQ(outcome.buffer.find_first_not_of(kUntouched), std::string::npos);
 }
 
 TEST(Snapshot, HeaderIsCheckedAgainstTheSizeOfItsFile) {

@@ -33,9 +33,9 @@ class Stream {
   }
 
   /// Hands the stream to `parse` from an odd address, with nothing behind its last byte.
-  template <class Parse, class Context>
-  auto into(Parse parse, Context* context) const {
-    return parse(context, bytes_.data() + 1, static_cast<uint32_t>(bytes_.size() - 1));
+  template <class Parse, class... Context>
+  auto into(Parse parse, Context*... context) const {
+    return parse(context..., bytes_.data() + 1, static_cast<uint32_t>(bytes_.size() - 1));
   }
 
  private:

@@ -234,10 +234,11 @@ class Pages(unittest.TestCase):
         self.assertEqual(self.browser.find_elements(By.CSS_SELECTOR, "tr.detail"), [])
 
     def test_a_difference_draws_falls_downwards(self):
-        self.write("a.stats", record(14, [5, 18446744073709551615, 3]) + record(4, [0]))
+        self.write("a.stats", record(14, [5, 18446744073709551615, 3]) + record(4, [0]) + record(5, [7]))
         self.write("b.stats", record(14, [9, 18446744073709551613, 3]) + record(4, [6]))
         self.open("diff", "stats", "a.stats", "b.stats")
         self.assertEqual(self.rows(), [["4", "hostWrites", "0", "6", "+6", "", ""],
+                                       ["5", "hostWritesDyn", "7", "", "", "", ""],
                                        ["14", "hostWriteLogHisto", "18446744073709551623", "18446744073709551625",
                                         "+2", "+0.0", "3"]])
         detail = self.open_row("hostWriteLogHisto")
