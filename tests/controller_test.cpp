@@ -3,7 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <utility>
+#include <sstream>
 
 #include "ksp/ksp.h"
 #include "tests/scripted_platform.h"
@@ -22,44 +22,30 @@ std::string notice(const std::string& operation, const std::string& className) {
   return "notice: Fendrel: " + operation + ": Controller found: " + className + "\n";
 }
 
-TEST(Selectors, StandBehindTheirAccessorsInEveryRow) {
-  const struct {
-    const SelectorPair& pair;
-    uint32_t number;
-    SelectorAccessor accessor;
-    SelectorAccessor ExporterEntry::*slot;
-  } selectors[] = {
-      {statsSelector, 13, getStatsSelector, &ExporterEntry::getStatsSelector},
-      {readStatsSelector, 10, getReadStatsSelector, &ExporterEntry::getReadStatsSelector},
-      {mspStatsSelector, 221, getMspStatsSelector, &ExporterEntry::getMspStatsSelector},
-      {bandStatsSelector, 11, getBandStatsSelector, &ExporterEntry::getBandStatsSelector},
-      {defectsListSelector, 15, getDefectsListSelector, &ExporterEntry::getDefectsListSelector},
-      {telemetryListSelectors, 17, getTelemetryListSelectors, &ExporterEntry::getTelemetryListSelectors},
-      {taskSchedulerSelectors, 39, getTaskSchedulerSelectors, &ExporterEntry::getTaskSchedulerSelectors},
-      {snapshotSelectors, 22, getSnapshotSelectors, &ExporterEntry::getSnapshotSelectors},
-      {snapshotHeaderSelectors, 145, getSnapshotHeaderSelectors, &ExporterEntry::getSnapshotHeaderSelectors},
-  };
-  for (const auto& [pair, number, accessor, slot] : selectors) {
-    SCOPED_TRACE(number);
-    EXPECT_EQ(pair.word0, number);
-    EXPECT_EQ(pair.word1, number);
-    EXPECT_EQ(accessor(), &pair);
-    for (int row = 0; row < 3; ++row) {
-      const bool isEmpty = row != 0 && accessor == getMspStatsSelector;
-      EXPECT_EQ(kRows[row].*slot, isEmpty ? nullptr : accessor);
-    }
+/// What tells one row from another: its names, its methods and the numbers of its selectors.
+std::string textOf(const ExporterEntry& row) {
+  std::ostringstream text;
+  text << row.className << ", " << row.propertyKey << ", " << row.tunnelMethod << ' ' << row.secondaryMethod
+       << ' ' << static_cast<int32_t>(row.extraMethod) << ',';
+  for (const SelectorAccessor accessor :
+       {row.getStatsSelector, row.getReadStatsSelector, row.getMspStatsSelector, row.getBandStatsSelector,
+        row.getDefectsListSelector, row.getTelemetryListSelectors, row.getTaskSchedulerSelectors,
+        row.getSnapshotSelectors, row.getSnapshotHeaderSelectors}) {
+    const SelectorPair pair = accessor == nullptr ? SelectorPair{} : *accessor();
+    text << ' ' << pair.word0;
+    if (pair.word1 != pair.word0) text << '/' << pair.word1;
   }
+  return text.str();
 }
 
 TEST(ExporterTable, RowsDifferInNamesMethodsAndMediaStatistics) {
-  const char* const classes[] = {kFlash, kEmbedded, "KSPStorage"};
+  EXPECT_EQ(textOf(kRows[0]),
+            std::string(kFlash) + ", Controller Characteristics, 9 9 -1, 13 10 221 11 15 17 39 22 145");
+  EXPECT_EQ(textOf(kRows[1]),
+            std::string(kEmbedded) + ", Controller Characteristics, 9 9 -1, 13 10 0 11 15 17 39 22 145");
+  EXPECT_EQ(textOf(kRows[2]), "KSPStorage, PropertyMatch, 8 8 5, 13 10 0 11 15 17 39 22 145");
   for (int row = 0; row < 3; ++row) {
     const ExporterEntry& entry = kRows[row];
-    EXPECT_STREQ(entry.className, classes[row]);
-    EXPECT_STREQ(entry.propertyKey, row == 2 ? "PropertyMatch" : "Controller Characteristics");
-    EXPECT_EQ(entry.tunnelMethod, row == 2 ? 8u : 9u);
-    EXPECT_EQ(entry.secondaryMethod, row == 2 ? 8u : 9u);
-    EXPECT_EQ(entry.extraMethod, row == 2 ? 5u : 0xFFFFFFFFu);
     EXPECT_EQ(entry.parseBuffer, KSPParseBufferToCxt);
     EXPECT_EQ(entry.releaseContext, KSPReleaseContext);
     EXPECT_EQ(entry.parseMspBuffer, row == 0 ? KSPMSPParseBufferToCxt : nullptr);
@@ -148,27 +134,30 @@ TEST(Connection, OpensThroughASecondLookupAndCloses) {
   const std::string found = notice("findNandExporter", kEmbedded);
   EXPECT_EQ(scripted::calls(),
             (Calls{found, found, "open 102 type 0", "release 102", "close 50", "release 101"}));
-  EXPECT_EQ(scripted::unbalanced(), Calls{});
 }
 
 TEST(Connection, JudgesByHandleAndAccessorAndSaysWhatFails) {
   const std::string cannot = "Can't get KSP Connection!\n";
   const std::string failed = "OpenServiceConnection failed for class 'VantorFlash3NVMeController', result 0x";
+  const Calls looked = {"release 101"};
+  const Calls refused = {"open 102 type 0", "release 102", "release 101"};
+  const Calls closed = {"open 102 type 0", "release 102", "close 50", "release 101"};
   const struct {
     Script script;
     ExporterEntry* row;
     std::string message;
+    Calls calls;
     int result = 0;
     SelectorAccessor stats = getStatsSelector;
   } cases[] = {
-      {{}, kRows + 3, "Can't get KSP Connection, no matching service!\n"},
-      {{.present = {kFlash}, .missingLookups = {2}}, kRows + 3, "No class found" + cannot},
-      {{.present = {kFlash}, .opens = {{kFlash, kRefused}}}, kRows, failed + "e00002c5\n" + cannot},
-      {{.present = {kFlash}, .opens = {{kFlash, {.handle = 0}}}}, kRows, cannot},
-      {{.present = {kFlash}}, kRows, cannot, 0, getReadStatsSelector},
-      {{.present = {kFlash}, .opens = {{kFlash, {.result = 0x2C5}}}}, kRows, failed + "2c5\n", 1},
+      {{}, kRows + 3, "Can't get KSP Connection, no matching service!\n", {}},
+      {{.present = {kFlash}, .missingLookups = {2}}, kRows + 3, "No class found" + cannot, looked},
+      {{.present = {kFlash}, .opens = {{kFlash, kRefused}}}, kRows, failed + "e00002c5\n" + cannot, refused},
+      {{.present = {kFlash}, .opens = {{kFlash, {.handle = 0}}}}, kRows, cannot, refused},
+      {{.present = {kFlash}}, kRows, cannot, closed, 0, getReadStatsSelector},
+      {{.present = {kFlash}, .opens = {{kFlash, {.result = 0x2C5}}}}, kRows, failed + "2c5\n", closed, 1},
   };
-  for (const auto& [script, row, message, result, stats] : cases) {
+  for (const auto& [script, row, message, calls, result, stats] : cases) {
     scripted::play(script);
     kRows[0].getStatsSelector = stats;
     KSPConnection connection = {7, 7, nullptr};
@@ -181,7 +170,9 @@ TEST(Connection, JudgesByHandleAndAccessorAndSaysWhatFails) {
     EXPECT_EQ(connection.connection, result == 0 ? 0u : 0x50u);
     EXPECT_EQ(connection.exporter, row);
     closeKSPConnection(&connection);
-    EXPECT_EQ(scripted::unbalanced(), Calls{});
+    Calls held = scripted::calls();
+    std::erase_if(held, [](const std::string& call) { return call.starts_with("notice: "); });
+    EXPECT_EQ(held, calls);
   }
 }
 

@@ -42,7 +42,4 @@ void play(Script script);
 /// What was called since `play`.
 const std::vector<std::string>& calls();
 
-/// What was opened and not closed, obtained and not released, or given back without being held.
-std::vector<std::string> unbalanced();
-
 }  // namespace scripted
