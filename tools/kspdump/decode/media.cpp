@@ -5,10 +5,11 @@
 namespace kspdump {
 
 void decodeMedia(const Decoding& /*decoding*/, Capture& capture, Collector& collector) {
-  ksp::MediaRecords records(capture.bytes.data(), capture.bytes.size());
-  capture.share = walk(records, capture.bytes, kMediaWords, [&](const ksp::Record& record) {
+  const Bytes bytes = capture.bytes;
+  ksp::MediaRecords records(bytes.data(), bytes.size());
+  capture.share = walk(records, bytes, kMediaWords, [&](const ksp::Record& record) {
     findSize(capture, record, kMediaWords);
-    collect(collector, record, valuesOf(capture, record, kMediaWords));
+    collect(collector, record, valuesOf(bytes, record, kMediaWords));
   });
   findEnd(capture, records.ending(), kMediaWords);
 }

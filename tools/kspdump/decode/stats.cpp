@@ -10,12 +10,13 @@ namespace kspdump {
 using std::to_string;
 
 void decodeStats(const Decoding& decoding, Capture& capture, Collector& collector) {
+  const Bytes bytes = capture.bytes;
   ksp::StatisticsRecords records(
-      capture.bytes.data(), capture.bytes.size(), ksp::StatisticsFraming::kMarked,
+      bytes.data(), bytes.size(), ksp::StatisticsFraming::kMarked,
       decoding.byNumber ? ksp::StatisticsNaming::kByNumber : ksp::StatisticsNaming::kByTable);
-  capture.share = walk(records, capture.bytes, kStatsWords, [&](const ksp::Record& record) {
+  capture.share = walk(records, bytes, kStatsWords, [&](const ksp::Record& record) {
     findSize(capture, record, kStatsWords);
-    collect(collector, record, valuesOf(capture, record, kStatsWords));
+    collect(collector, record, valuesOf(bytes, record, kStatsWords));
   });
   findEnd(capture, records.ending(), kStatsWords);
 }
@@ -29,7 +30,7 @@ void decodeSummary(const Decoding& /*decoding*/, Capture& capture, Collector& co
     const ksp::SummaryField* const field = ksp::findSummaryField(record.key);
     if (field == nullptr && record.key != ksp::kReadCountHisto) return;
     findSize(capture, record, kStatsWords);
-    Values values = valuesOf(capture, record, kStatsWords);
+    Values values = valuesOf(capture.bytes, record, kStatsWords);
     if (field != nullptr && field->low != nullptr) {
       const Values low(capture.bytes.data() + record.offset + kStatsWords.headerSize, 1, kLowBytes,
                        kLowBytes);

@@ -4,7 +4,7 @@ namespace kspdump {
 
 using std::to_string;
 
-void tellSize(Capture& capture, const ksp::Record& record, const StreamWords& words) {
+void tellSize(Capture& capture, ksp::Record record, const StreamWords& words) {
   const ksp::RecordName name = record.name();
   const std::string title = std::string(name.view()) + "(" + to_string(record.key) + ") carries " +
                             counted(record.announced, words.unit);
@@ -16,7 +16,7 @@ void tellSize(Capture& capture, const ksp::Record& record, const StreamWords& wo
   }
 }
 
-void findEnd(Capture& capture, const ksp::Ending& ending, const StreamWords& words) {
+void findEnd(Capture& capture, ksp::Ending ending, const StreamWords& words) {
   using Reason = ksp::EndReason;
   const uint64_t size = capture.bytes.size();
   const uint64_t left = size - ending.offset;

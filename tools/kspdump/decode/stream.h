@@ -25,9 +25,9 @@ inline constexpr StreamWords kMediaWords = {ksp::MediaRecords::kHeaderSize, "rec
                                             "end record"};
 
 /// A record's elements, as `record` has them.
-inline Values valuesOf(const Capture& capture, const ksp::Record& record, const StreamWords& words) {
+inline Values valuesOf(Bytes bytes, const ksp::Record& record, const StreamWords& words) {
   const auto width = static_cast<uint8_t>(record.elements.width());
-  return {capture.bytes.data() + record.offset + words.headerSize, record.elements.size(), width, width};
+  return {bytes.data() + record.offset + words.headerSize, record.elements.size(), width, width};
 }
 
 /// The end of the zeros that a capture is filled up with from `offset` on.
@@ -45,7 +45,8 @@ inline uint64_t behindEnd(Bytes bytes, const ksp::Ending& ending, const StreamWo
   return announced <= bytes.size() - header ? header + announced : header;
 }
 
-/// Walks a stream: hands each record that counts to `each`, and measures how much of it is known.
+/// Walks a stream that nothing else refers to, so that the walk stays in registers: hands each record that
+/// counts to `each`, and measures how much of it is known.
 template <class Stream, class Each>
 Share walk(Stream& records, Bytes bytes, const StreamWords& words, Each each) {
   Share share = {.of = bytes.size()};
@@ -61,7 +62,7 @@ Share walk(Stream& records, Bytes bytes, const StreamWords& words, Each each) {
     }
     if (record.counts) each(record);
   }
-  const ksp::Ending& ending = records.ending();
+  const ksp::Ending ending = records.ending();
   if (ending.reason == ksp::EndReason::kEndMarker) {
     const uint64_t behind = behindEnd(bytes, ending, words);
     share.recognised += behind - ending.offset;
@@ -78,8 +79,8 @@ inline uint64_t leftOver(const ksp::Record& record, const StreamWords& words) {
   return uint64_t{record.announced} * words.unitSize % record.elements.width();
 }
 
-/// Names what is wrong with a record's size.
-void tellSize(Capture& capture, const ksp::Record& record, const StreamWords& words);
+/// Names what is wrong with a record's size; of a copy, so that the walk's own stays in registers.
+void tellSize(Capture& capture, ksp::Record record, const StreamWords& words);
 
 /// Names a record that has not the size that its key is configured with, and bytes that fill no element.
 inline void findSize(Capture& capture, const ksp::Record& record, const StreamWords& words) {
@@ -87,7 +88,7 @@ inline void findSize(Capture& capture, const ksp::Record& record, const StreamWo
 }
 
 /// Names what ended a walk before the capture's last byte, and bytes behind the end that may hide something.
-void findEnd(Capture& capture, const ksp::Ending& ending, const StreamWords& words);
+void findEnd(Capture& capture, ksp::Ending ending, const StreamWords& words);
 
 /// Hands on a record under its name.
 inline void collect(Collector& collector, const ksp::Record& record, const Values& values) {

@@ -29,11 +29,12 @@ bool isTarHeader(std::span<const unsigned char> header) {
     told = told * 8 + (c - '0');
     ++digits;
   }
+  if (digits == 0) return false;
   uint32_t sum = kSumBytes * ' ';
   for (size_t i = 0; i < kTellingBytes; ++i) {
     if (i < kSumAt || i >= kSumAt + kSumBytes) sum += header[i];
   }
-  return digits != 0 && told == sum;
+  return told == sum;
 }
 
 }  // namespace

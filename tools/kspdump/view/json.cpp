@@ -56,7 +56,13 @@ class Json : public View {
   void records(std::span<const Record> records) override {
     Appender appender(sink_);
     for (const Record& record : records) {
-      appender.text(headOf(record).substr(hasRecords_ ? 0 : kRecordEnd.size() + 1));
+      const Head& head = headOf(record);
+      const size_t skipped = hasRecords_ ? 0 : kRecordEnd.size() + 1;
+      if (head.size <= Appender::kShort) {
+        appender.shortText(head.text.data() + skipped, head.size - skipped);
+      } else {
+        appender.text(std::string_view(head.text).substr(skipped));
+      }
       hasRecords_ = true;
       appender.list(record.values);
     }
@@ -196,21 +202,24 @@ class Json : public View {
   struct Head {
     uint32_t key = 0;
     std::string name;
+    /// `size` characters, and zeros behind a short one for it to be copied at a constant size.
     std::string text;
+    size_t size = 0;
   };
 
-  std::string_view headOf(const Record& record) {
+  const Head& headOf(const Record& record) {
     Head& head = heads_[record.key % heads_.size()];
     if (head.text.empty() || head.key != record.key || head.name != record.name) {
-      head.key = record.key;
-      head.name = record.name;
-      head.text = std::string(kRecordEnd) + ",{\"key\":";
-      appendNumber(head.text, record.key);
-      head.text += ",\"name\":";
-      appendJson(head.text, record.name);
-      head.text += ",\"values\":[";
+      std::string text = std::string(kRecordEnd) + ",{\"key\":";
+      appendNumber(text, record.key);
+      text += ",\"name\":";
+      appendJson(text, record.name);
+      text += ",\"values\":[";
+      const size_t size = text.size();
+      if (size <= Appender::kShort) text.resize(kRecordEnd.size() + 1 + Appender::kShort);
+      head = {record.key, std::string(record.name), std::move(text), size};
     }
-    return head.text;
+    return head;
   }
 
   bool hasRecords_ = false;

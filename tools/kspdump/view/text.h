@@ -4,6 +4,7 @@
 #include <charconv>
 #include <concepts>
 #include <cstddef>
+#include <cstring>
 #include <iterator>
 #include <string>
 #include <string_view>
@@ -34,18 +35,25 @@ class Appender {
   }
 
   void number(uint64_t number) {
-    if (static_cast<size_t>(std::end(buffer_) - at_) < ksp::kDecimalRoom) flush();
+    makeSure(ksp::kDecimalRoom);
     at_ = ksp::writeDecimal(at_, number);
+  }
+
+  /// Appends a text of at most `kShort` characters; so many can be read behind `piece`, whatever its size.
+  static constexpr size_t kShort = 96;
+  void shortText(const char* piece, size_t size) {
+    makeSure(kShort);
+    std::memcpy(at_, piece, kShort);
+    at_ += size;
   }
 
   /// Appends numbers with commas between them.
   void list(const Values& values) {
-    constexpr size_t kRoom = ksp::kDecimalRoom + 1;
+    constexpr uint32_t kAtOnce = 32;
     const uint32_t count = values.size();
     for (uint32_t done = 0; done < count;) {
-      if (static_cast<size_t>(std::end(buffer_) - at_) < kRoom) flush();
-      const size_t room = static_cast<size_t>(std::end(buffer_) - at_) / kRoom;
-      const auto end = static_cast<uint32_t>(std::min<size_t>(count, done + room));
+      const uint32_t end = done + std::min(count - done, kAtOnce);
+      makeSure(kAtOnce * (ksp::kDecimalRoom + 1));
       char* at = at_;
       values.forEach(done, end, [&](uint64_t value) {
         at = ksp::writeDecimal(at, value);
@@ -58,6 +66,10 @@ class Appender {
   }
 
  private:
+  void makeSure(size_t room) {
+    if (static_cast<size_t>(std::end(buffer_) - at_) < room) flush();
+  }
+
   void flush() {
     sink_.text.append(buffer_, at_);
     at_ = buffer_;
@@ -68,7 +80,7 @@ class Appender {
   void makeRoom() { sink_.text.reserve(sink_.text.size() + sizeof buffer_); }
 
   Sink& sink_;
-  char buffer_[4096];
+  char buffer_[8192];
   char* at_ = buffer_;
 };
 
