@@ -395,6 +395,17 @@ TEST_F(Kspdump, SnapshotsAreSeriesInTheOrderOfTime) {
             "HW         0   2.50         4  _@@=\n"
             "NW         0   3.50         8  _=:@\n"
             "NW/HW   0.50   1.40      4.00   :.@\n");
+  EXPECT_EQ(run("snapshot --format openmetrics --match HW ring").out,
+            "ksp_snapshot{source=\"ring\",name=\"HW\"} 2\n# EOF\n");
+  // Two words a record, the second its key, which is not shown.
+  const auto field = [](uint64_t offset, const std::string& format) {
+    return numbers<4>({0, offset, 4}) + format + std::string(16 - format.size(), '\0');
+  };
+  write("h",
+        numbers<4>({0, 5, 8, 5, 0, 0, 36, 0, 0}) + numbers<4>({2, 0}) + field(4, "#=%u") + field(0, " A=%u"));
+  write("keyed", numbers<4>({3, 30, 4, 40, 1, 10, 2, 20, 9, 0}));
+  EXPECT_EQ(run("snapshot --header h --format openmetrics --match A keyed").out,
+            "ksp_snapshot{source=\"keyed\",name=\"A\"} 4\n# EOF\n");
   std::istringstream lines(
       shell("COLUMNS=80 $KSPDUMP snapshot --format chart " KSP_EXAMPLE_CAPTURES "/day.snapshot").out);
   size_t count = 0;

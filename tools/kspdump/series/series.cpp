@@ -4,6 +4,9 @@
 #include <cmath>
 #include <numeric>
 
+#include "snapshot/header.h"
+#include "snapshot/word.h"
+
 namespace kspdump {
 
 void Series::begin(const Capture& capture) {
@@ -39,13 +42,12 @@ void Series::end(const Capture& capture) {
 }
 
 void Series::putInTime(const Capture& capture) {
-  const bool isFixed = capture.header.empty();
-  if (intervals_.empty() || !(isFixed || tracks_.front().name == "T")) return;
-  // The timestamp is the first word of the fixed layout, shown or not.
-  const Values time = isFixed ? Values(capture.bytes.data(), 1, 4, 4) : fields_.front();
+  if (intervals_.empty()) return;
+  // The timestamp is the first word of the fixed layout, and the key of a header's; shown or not.
+  const auto key = capture.header.empty() ? 0 : ksp::SnapshotHeader(capture.header.data()).keyOffset();
+  if (!key) return;
   const auto timeOf = [&](const Interval& interval) {
-    return time.movedBy(static_cast<std::ptrdiff_t>(interval.offset) -
-                        static_cast<std::ptrdiff_t>(isFixed ? 0 : fieldsOffset_))[0];
+    return ksp::loadWord(capture.bytes.data() + interval.offset + *key);
   };
   std::erase_if(intervals_, [&](const Interval& interval) { return timeOf(interval) == 0; });
   const auto isEarlier = [&](const Interval& a, const Interval& b) { return timeOf(a) < timeOf(b); };

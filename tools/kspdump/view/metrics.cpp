@@ -82,14 +82,14 @@ class Metrics : public View {
     // The summary's fields are statistics of that name.
     const Kind family = capture.kind == Kind::kSummary ? Kind::kStats : capture.kind;
     front_.assign("ksp_").append(kindName(family)).append("{source=\"").append(escaped(capture.source));
-    interval_.clear();
+    intervals_ = {};
+    if (isSnapshot_) intervals_.begin(capture);
   }
 
   void records(std::span<const Record> records) override {
+    if (isSnapshot_) return intervals_.records(records);
     for (const Record& record : records) {
-      if (isSnapshot_) {
-        keepInterval(record);
-      } else if (last_.isLast(record.key, place_++)) {
+      if (last_.isLast(record.key, place_++)) {
         add(record);
       } else if (repeated_.size() < kMostRepeated) {
         repeated_.push_back({record.offset, std::string(record.name) + "(" + std::to_string(record.key) +
@@ -99,7 +99,7 @@ class Metrics : public View {
   }
 
   void end(Capture& capture) override {
-    for (const Record& record : interval_) add(record);
+    if (isSnapshot_) addNewest(capture);
     for (Finding& finding : repeated_) capture.find(finding.offset, std::move(finding.reason));
     last_.clear();
     place_ = 0;
@@ -110,10 +110,18 @@ class Metrics : public View {
  private:
   static constexpr size_t kMostRepeated = 1000;
 
-  /// Of a snapshot the last interval is shown.
-  void keepInterval(const Record& record) {
-    if (!interval_.empty() && interval_.front().key != record.key) interval_.clear();
-    interval_.push_back(record);
+  /// Of a snapshot the newest interval in use is shown.
+  void addNewest(const Capture& capture) {
+    intervals_.end(capture);
+    const std::vector<Track>& tracks = intervals_.tracks();
+    for (size_t track = 0; track < tracks.size() && intervals_.points() != 0; ++track) {
+      const Values values = intervals_.values(track, intervals_.points() - 1);
+      add({.offset = 0,
+           .key = 0,
+           .isArray = tracks[track].isArray,
+           .name = tracks[track].name,
+           .values = values});
+    }
   }
 
   void add(const Record& record) {
@@ -141,7 +149,7 @@ class Metrics : public View {
   LastOfKeys last_;
   uint32_t place_ = 0;
   std::vector<Finding> repeated_;
-  std::vector<Record> interval_;
+  Series intervals_;
 };
 
 }  // namespace
