@@ -182,7 +182,7 @@ TEST_F(Kspdump, FindingsNameOffsetAndReason) {
       {"media", soundMedia + media(9, value + "ab"),
        "offset 20: Media_9(9) carries 6 bytes, of which the last 2 fill no element of 4", 2},
       {"media", soundMedia + media(0x2FFF, value) + "\1",
-       "offset 28: 1 byte behind the end record that are not all zeros, and not read", 1},
+       "offset 28: 1 byte behind the end record that is not zero, and not read", 1},
       {"media", sound, "offset 0: looks like statistics, 100 % recognised", 0},
       {"snapshot", std::string(504, '\0'), "offset 0: there is nothing in it but zeros", 52},
       {"snapshot", interval(1) + "\1", "offset 252: 1 byte left over, fewer than a record", 26},
@@ -367,6 +367,23 @@ TEST_F(Kspdump, TrendsGoOverCapturesOrAStatistic) {
   EXPECT_EQ(over.out, "source,over powerOnHours,hostWrites\nb,10,40\nc,20,70\na,30,100\n");
   EXPECT_EQ(over.err, "kspdump: d: offset 0: there is no value of powerOnHours in it; it is left out\n");
   EXPECT_EQ(over.status, 1);
+  // Of the ill captures one is left out; the other, more of whose records are ill than are kept, is not.
+  std::string ill = record(34, {40});
+  for (int i = 0; i < 102; ++i) ill += record(15, {1});
+  write("e", ill);
+  for (const auto& [format, finding] :
+       {std::pair("table", "! d: offset 0: there is no value of powerOnHours"),
+        {"chart", "! d: offset 0: there is no value of powerOnHours"},
+        {"html", "<li>d: offset 0: there is no value of powerOnHours"},
+        {"table", "! e: 2 further findings\n"},
+        {"html", "<li>e: 2 further findings</li>"},
+        {"json", R"("further_findings":2)"},
+        {"json", R"({"source":"d","offset":0,"reason":"there is no value)"}}) {
+    const Outcome shown = run("trend stats --over powerOnHours a d b e --format " + std::string(format));
+    EXPECT_NE(shown.out.find(finding), std::string::npos) << shown.out.substr(shown.out.size() / 2);
+    EXPECT_EQ(shown.err, "");
+    EXPECT_EQ(shown.status, 1);
+  }
   EXPECT_EQ(shell("LC_ALL=C $KSPDUMP trend stats --over powerOnHours --match hostWrites a b c").out,
             "statistics, 3 captures, 1 changed, over powerOnHours 10 to 30\n"
             "KEY  NAME        FIRST  LAST  LEAST  GREATEST  CHANGE       %  PER UNIT  TREND\n"

@@ -78,7 +78,7 @@ void tell(const std::string& source, const std::vector<Finding>& findings, uint6
   for (const Finding& finding : findings) {
     complain(source, "offset " + std::to_string(finding.offset) + ": " + finding.reason);
   }
-  if (further != 0) complain(source, std::to_string(further) + " further findings");
+  if (further != 0) complain(source, counted(further, "further finding"));
 }
 
 /// Exit status, and whether anything was decoded that an output file could hold.
@@ -234,23 +234,33 @@ class Row {
     decode(options_.decoding, capture, [&](std::span<const Record> records) {
       if (series != nullptr) series->records(records);
     });
-    if (isLeftOut) capture.find(0, "there is no value of " + options_.over + " in it; it is left out");
+    if (isLeftOut) {
+      capture.findings.insert(capture.findings.begin(),
+                              {0, "there is no value of " + options_.over + " in it; it is left out"});
+      capture.bytes = {};
+      leftOut_.push_back(capture);
+    }
     if (series != nullptr) series->end(capture);
     if (over) over_.values.push_back(*over);
     if (capture.isClean()) return;
     hasFindings_ = true;
-    if (!showsFindings_ || isLeftOut) tell(capture.source, capture.findings, capture.furtherFindings);
+    if (!showsFindings_) tell(capture.source, capture.findings, capture.furtherFindings);
   }
 
   /// Throws UsageError where there are fewer than two.
   Series& finish() {
-    const size_t points = series_.captures().size();
-    if (points < 2)
+    const size_t points = series_.points();
+    if (points < 2) {
+      // Nothing is shown that could have them.
+      for (const Capture& capture : leftOut_) {
+        if (showsFindings_) tell(capture.source, capture.findings, capture.furtherFindings);
+      }
       throw UsageError("a trend takes two captures or more, but got " + counted(points, "capture"));
+    }
     series_.rank(options_.ranking);
     if (!options_.over.empty()) {
       over_.name = options_.over;
-      series_.goOver(over_);
+      series_.goOver(over_, leftOut_);
     }
     return series_;
   }
@@ -277,6 +287,7 @@ class Row {
   bool showsFindings_;
   Series series_;
   Over over_;
+  std::vector<Capture> leftOut_;
   bool isUnreadable_ = false;
   bool hasFindings_ = false;
 };

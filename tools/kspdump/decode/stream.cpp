@@ -32,7 +32,8 @@ void findEnd(Capture& capture, ksp::Ending ending, const StreamWords& words) {
     const uint64_t hidden = endOfZeros(capture.bytes, behindEnd(capture.bytes, ending, words));
     if (hidden != size) {
       capture.find(hidden, counted(size - hidden, "byte") + " behind the " + words.end +
-                               " that are not all zeros, and not read");
+                               (size - hidden == 1 ? " that is not zero" : " that are not all zeros") +
+                               ", and not read");
     }
   }
 }

@@ -57,7 +57,7 @@ void Series::putInTime(const Capture& capture) {
     std::rotate(intervals_.begin(), oldest, intervals_.end());
 }
 
-void Series::goOver(const Over& over) {
+void Series::goOver(const Over& over, const std::vector<Capture>& leftOut) {
   std::vector<size_t> order(captures_.size());
   std::iota(order.begin(), order.end(), size_t{0});
   std::stable_sort(order.begin(), order.end(),
@@ -71,6 +71,7 @@ void Series::goOver(const Over& over) {
     sorted.cells_.push_back(std::move(cells_[point]));
   }
   captures_ = std::move(sorted.captures_);
+  captures_.insert(captures_.end(), leftOut.begin(), leftOut.end());
   copies_ = std::move(sorted.copies_);
   cells_ = std::move(sorted.cells_);
 }

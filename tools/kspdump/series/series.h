@@ -39,16 +39,18 @@ class Series {
   /// Says which tracks are shown.
   void rank(const Ranking& ranking) { ranking_ = ranking; }
   [[nodiscard]] bool showsUnchanged() const { return ranking_.withUnchanged; }
-  /// Puts captures in ascending order of a statistic, `over.values` being those in the order given.
-  void goOver(const Over& over);
+  /// Puts captures in ascending order of a statistic, `over.values` being those in the order given. Captures
+  /// without it are no points.
+  void goOver(const Over& over, const std::vector<Capture>& leftOut);
   /// Null where the series goes in the order given.
   [[nodiscard]] const Over* over() const { return over_ ? &*over_ : nullptr; }
 
   [[nodiscard]] Kind kind() const { return captures_.front().kind; }
-  /// What was read, with its findings: a capture a point or, of a snapshot, one for all points.
+  /// What was read, with its findings: a capture a point, behind them those left out; or, of a snapshot, one
+  /// for all points.
   [[nodiscard]] const std::vector<Capture>& captures() const { return captures_; }
 
-  [[nodiscard]] size_t points() const { return isSnapshot_ ? intervals_.size() : captures_.size(); }
+  [[nodiscard]] size_t points() const { return isSnapshot_ ? intervals_.size() : cells_.size(); }
   /// The number that a snapshot's record has at a point.
   [[nodiscard]] uint32_t recordNumber(size_t point) const { return intervals_[point].number; }
 

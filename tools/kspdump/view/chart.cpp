@@ -33,7 +33,7 @@ class Chart : public View {
     out += cutTo(printable(capture.source), options_.width - std::min(options_.width, what.size())) + what +
            "\n";
     if (intervals_.points() != 0) addIntervals();
-    addFindings(capture, "");
+    appendFindings(sink_.text, capture);
     intervals_ = {};
   }
 
@@ -50,7 +50,7 @@ class Chart : public View {
               [&](size_t point) { return series.sum(track, point); });
     }
     addLines(grid, lines);
-    for (const Capture& capture : series.captures()) addFindings(capture, printable(capture.source) + ": ");
+    appendFindings(out, series);
   }
 
   [[nodiscard]] bool showsFindings() const override { return true; }
@@ -147,16 +147,6 @@ class Chart : public View {
       }
       out += '\n';
       sink_.offer();
-    }
-  }
-
-  void addFindings(const Capture& capture, const std::string& source) {
-    for (const Finding& finding : capture.findings) {
-      sink_.text += "! " + source + "offset " + std::to_string(finding.offset) + ": " +
-                    printable(finding.reason) + "\n";
-    }
-    if (capture.furtherFindings != 0) {
-      sink_.text += "! " + source + counted(capture.furtherFindings, "further finding") + "\n";
     }
   }
 

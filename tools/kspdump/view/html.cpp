@@ -251,7 +251,10 @@ class Html : public View {
     std::string json = "{\"view\":\"";
     json.append(nameOf(about)).append("\",\"kind\":\"").append(kindName(captures.front().kind));
     json += "\",\"points\":[";
-    for (size_t i = 0; i < (isSnapshot ? series_.points() : captures.size()); ++i) {
+    const size_t points = isSnapshot         ? series_.points()
+                          : over_ != nullptr ? over_->values.size()
+                                             : captures.size();
+    for (size_t i = 0; i < points; ++i) {
       if (i != 0) json += ',';
       if (isSnapshot) {
         appendNumber(json, series_.recordNumber(i));
@@ -315,7 +318,7 @@ class Html : public View {
   void showChanges(About about, const Series& series, const char* between) {
     const std::vector<Capture>& captures = series.captures();
     over_ = series.over();
-    beginSection(about, captures.front().source + between + captures.back().source, captures);
+    beginSection(about, captures.front().source + between + captures[series.points() - 1].source, captures);
     for (const size_t track : series.tracksInOrder()) {
       points_.clear();
       for (size_t point = 0; point < series.points(); ++point) points_.push_back(series.values(track, point));

@@ -2,6 +2,7 @@
 
 #include <array>
 #include <optional>
+#include <span>
 #include <string>
 #include <string_view>
 
@@ -12,20 +13,33 @@ namespace kspdump {
 
 namespace {
 
-void appendFindings(std::string& out, std::string_view member, const Capture& capture) {
+/// The findings of captures as a document's members, on request with the source of each.
+void appendFindings(std::string& out, std::string_view member, std::span<const Capture> captures,
+                    bool withSources = false) {
   out.append("\"").append(member).append("\":[");
-  for (const Finding& finding : capture.findings) {
-    if (&finding != capture.findings.data()) out += ',';
-    out += "{\"offset\":";
-    appendNumber(out, finding.offset);
-    out += ",\"reason\":";
-    appendJson(out, finding.reason);
-    out += '}';
+  const char* separator = "";
+  uint64_t further = 0;
+  for (const Capture& capture : captures) {
+    further += capture.furtherFindings;
+    for (const Finding& finding : capture.findings) {
+      out.append(separator).append("{");
+      separator = ",";
+      if (withSources) {
+        out += "\"source\":";
+        appendJson(out, capture.source);
+        out += ',';
+      }
+      out += "\"offset\":";
+      appendNumber(out, finding.offset);
+      out += ",\"reason\":";
+      appendJson(out, finding.reason);
+      out += '}';
+    }
   }
   out += ']';
-  if (capture.furtherFindings != 0) {
+  if (further != 0) {
     out.append(",\"further_").append(member).append("\":");
-    appendNumber(out, capture.furtherFindings);
+    appendNumber(out, further);
   }
 }
 
@@ -71,7 +85,7 @@ class Json : public View {
   void end(Capture& capture) override {
     if (hasRecords_) sink_.text += kRecordEnd;
     sink_.text += "],";
-    appendFindings(sink_.text, "findings", capture);
+    appendFindings(sink_.text, "findings", {&capture, 1});
     sink_.text += "}\n";
   }
 
@@ -99,9 +113,9 @@ class Json : public View {
       sink_.offer();
     }
     out += "],";
-    appendFindings(out, "old_findings", before);
+    appendFindings(out, "old_findings", {&before, 1});
     out += ',';
-    appendFindings(out, "new_findings", after);
+    appendFindings(out, "new_findings", {&after, 1});
     out += "}\n";
   }
 
@@ -142,21 +156,9 @@ class Json : public View {
       out += "]}";
       sink_.offer();
     }
-    out += "],\"findings\":[";
-    separator = "";
-    for (const Capture& capture : series.captures()) {
-      for (const Finding& finding : capture.findings) {
-        out.append(separator).append("{\"source\":");
-        separator = ",";
-        appendJson(out, capture.source);
-        out += ",\"offset\":";
-        appendNumber(out, finding.offset);
-        out += ",\"reason\":";
-        appendJson(out, finding.reason);
-        out += '}';
-      }
-    }
-    out += "]}\n";
+    out += "],";
+    appendFindings(out, "findings", series.captures(), true);
+    out += "}\n";
   }
 
   void listing(const Listing& listing) override {

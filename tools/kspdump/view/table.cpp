@@ -109,7 +109,7 @@ class Table : public View {
   }
 
   void end(Capture& capture) override {
-    addFindings(capture, "");
+    appendFindings(sink_.text, capture);
     greatestKey_ = 0;
     nameWidth_ = 0;
     greatestNarrow_ = 0;
@@ -130,16 +130,6 @@ class Table : public View {
   static constexpr std::string_view kNameHead = "NAME";
   static constexpr std::string_view kValueHead = "VALUE/SUM";
   static constexpr size_t kLeastKey = 5;
-
-  void addFindings(const Capture& capture, const std::string& source) {
-    for (const Finding& finding : capture.findings) {
-      sink_.text += "! " + source + "offset " + std::to_string(finding.offset) + ": " +
-                    printable(finding.reason) + "\n";
-    }
-    if (capture.furtherFindings != 0) {
-      sink_.text += "! " + source + counted(capture.furtherFindings, "further finding") + "\n";
-    }
-  }
 
   /// A name without anything that could steer a terminal; those of tables are plain.
   static std::string shown(std::string_view name) {
@@ -255,7 +245,7 @@ void Table::difference(const Series& series) {
     }
     appendChanges(sink_.text, wide_, width);
   });
-  for (const Capture& capture : series.captures()) addFindings(capture, printable(capture.source) + ": ");
+  appendFindings(out, series);
 }
 
 void Table::trend(const Series& series) {
@@ -307,7 +297,7 @@ void Table::trend(const Series& series) {
     }
     appendSparkline(sink_.text, values, width);
   });
-  for (const Capture& capture : series.captures()) addFindings(capture, printable(capture.source) + ": ");
+  appendFindings(out, series);
 }
 
 /// A series' rows with a picture behind each, made by `addPicture(row, width)`.

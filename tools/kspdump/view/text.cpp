@@ -126,6 +126,21 @@ std::string printable(std::string_view text) {
   return legibleUpTo(localeIsUtf8() ? 0x10FFFF : 0x7E, text);
 }
 
+void appendFindings(std::string& out, const Capture& capture, const std::string& source) {
+  for (const Finding& finding : capture.findings) {
+    out +=
+        "! " + source + "offset " + std::to_string(finding.offset) + ": " + printable(finding.reason) + "\n";
+  }
+  if (capture.furtherFindings != 0) {
+    out += "! " + source + counted(capture.furtherFindings, "further finding") + "\n";
+  }
+}
+
+void appendFindings(std::string& out, const Series& series) {
+  for (const Capture& capture : series.captures())
+    appendFindings(out, capture, printable(capture.source) + ": ");
+}
+
 bool localeIsUtf8() {
   static const bool utf8 = std::string_view(nl_langinfo(CODESET)) == "UTF-8";
   return utf8;

@@ -115,6 +115,10 @@ std::string legible(std::string_view text);
 /// The same in the characters of the locale.
 std::string printable(std::string_view text);
 
+/// Appends a line a finding, of a series with the names of its captures.
+void appendFindings(std::string& out, const Capture& capture, const std::string& source = "");
+void appendFindings(std::string& out, const Series& series);
+
 /// Returns whether the locale's characters are UTF-8.
 bool localeIsUtf8();
 
