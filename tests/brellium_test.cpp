@@ -117,7 +117,7 @@ class Daemon {
   bool next(char& c) {
     const auto left = std::chrono::duration_cast<milliseconds>(end_ - Clock::now()).count();
     pollfd readable = {.fd = terminal_, .events = POLLIN, .revents = 0};
-    if (poll(&readable, 1, static_cast<int>(std::max<long>(left, 0))) == 0)
+    if (poll(&readable, 1, static_cast<int>(std::max(left, milliseconds::rep{0}))) == 0)
       giveUp("its next line does not come");
     return read(terminal_, &c, 1) == 1;
   }
@@ -361,7 +361,7 @@ TEST_F(Brellium, AWrongHostFileStartsNothing) {
   EXPECT_EQ(unread.exitStatus(), 78) << "with nobody to read the line";
 }
 
-#ifndef KSP_SANITIZED
+#ifndef KSP_UNLIMITED
 TEST_F(Brellium, WhatTheSystemRefusesEndsWithALineAndItsStatus) {
   Daemon threadless(host(kEndless), [] {
     const rlimit boundless = {.rlim_cur = rlim_t{1} << 50, .rlim_max = RLIM_INFINITY};

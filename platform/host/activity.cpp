@@ -45,7 +45,8 @@ nanoseconds now() {
 
 void sleepUntil(nanoseconds end) {
   const auto whole = std::chrono::floor<seconds>(end);
-  const timespec time = {.tv_sec = whole.count(), .tv_nsec = (end - whole).count()};
+  const timespec time = {.tv_sec = static_cast<time_t>(whole.count()),
+                         .tv_nsec = static_cast<long>((end - whole).count())};
   int error = 0;
   do {
     error = clock_nanosleep(CLOCK_BOOTTIME, TIMER_ABSTIME, &time, nullptr);
@@ -220,7 +221,7 @@ struct Activity {
 
   void wait(seconds pause) {
     const nanoseconds end = now() + pause;
-    const time_t clock = time(nullptr) + pause.count();
+    const time_t clock = time(nullptr) + static_cast<time_t>(pause.count());
     tm local = {};
     std::array<char, 64> until = {};
     std::strftime(until.data(), until.size(), "%F %T %Z", localtime_r(&clock, &local));

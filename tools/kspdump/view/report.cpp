@@ -35,11 +35,11 @@ class Report : public View {
 
  private:
   void addFixed(Bytes records) {
-    constexpr size_t kChunk = size_t{4096} * ksp::kRecordBytes;
+    constexpr auto kRecord = static_cast<size_t>(ksp::kRecordBytes);
+    constexpr size_t kChunk = 4096 * kRecord;
     constexpr size_t kLongestLine = 1024;
-    const size_t usable = records.size() / ksp::kRecordBytes * ksp::kRecordBytes;
-    std::vector<char> text(ksp::kLegend.size() + std::min(kChunk, usable) / ksp::kRecordBytes * kLongestLine +
-                           2);
+    const size_t usable = records.size() / kRecord * kRecord;
+    std::vector<char> text(ksp::kLegend.size() + std::min(kChunk, usable) / kRecord * kLongestLine + 2);
     size_t done = 0;
     do {
       const size_t chunk = std::min(kChunk, usable - done);
