@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """What a fleet's captures cost without the library: decodes statistics captures to JSON, a line each.
 
 The same documents as `kspdump stats --format json`, made the straightforward way with the struct module.

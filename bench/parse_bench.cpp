@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The parsers beside two yardsticks: the plain parsers with printf formatting, and the floor, which only
 // allocates, links and frees the nodes that the parser would have filled. And what a client pays that only
 // looks, through a context and through the records themselves.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #pragma once
 
 // What names are made of. Each `writePiece` writes a piece at `at`, where all is zero, cuts it at `end`, and

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A host file of any bytes is accepted with its numbers in their bounds, or refused with one printable line.
 
 #include <clocale>

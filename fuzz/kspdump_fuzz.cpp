@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // kspdump's decoders and views: the first byte chooses the kind, and whether a snapshot has a header, which
 // the rest then begins with. JSON must be JSON and hold every value.
 

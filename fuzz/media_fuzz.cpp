@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "ksp/media_statistics.h"
 #include "tests/context_check.h"
 #include "tests/plain_parsers.h"

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # What is installed; debian/ distributes it over packages.
 
 include(CMakePackageConfigHelpers)

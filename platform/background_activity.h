@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #ifndef PLATFORM_BACKGROUND_ACTIVITY_H
 #define PLATFORM_BACKGROUND_ACTIVITY_H
 

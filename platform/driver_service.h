@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #ifndef PLATFORM_DRIVER_SERVICE_H
 #define PLATFORM_DRIVER_SERVICE_H
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #ifndef PLATFORM_MAIN_LOOP_H
 #define PLATFORM_MAIN_LOOP_H
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #ifndef PLATFORM_SYSTEM_LOG_H
 #define PLATFORM_SYSTEM_LOG_H
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the parsers allocate, and what becomes of a context when an allocation fails.
 
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The real daemon on the host port, at a terminal: its lines, its exit status, and how it stops.
 
 #include <fcntl.h>

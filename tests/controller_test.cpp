@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Lookups and connections on a scripted platform: handles, rows, messages.
 
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The real handler on a scripted platform: every call and every line, in order.
 
 #include <gtest/gtest.h>

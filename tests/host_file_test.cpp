@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Host files: what they may say, and the one line that names each fault.
 
 #include <sys/stat.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The host port's plain functions: what the machine tells, what follows from it, and how it is told on.
 
 #include <sys/stat.h>

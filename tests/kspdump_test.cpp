@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The real kspdump on captures: what it prints, what it names, how it ends.
 
 #include <gtest/gtest.h>

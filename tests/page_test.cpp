@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Pages without a browser: the pictures they are made of, and the numbers of a trend.
 
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Holds the parsers against parse_cases.txt and against the plain ones.
 
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Preloaded into the daemon by its end-to-end tests: a second of waiting, and of the clock that counts the
 // machine's sleep, takes 10 ms, and what the kernel tells of power and pressure is read below
 // $KSP_TEST_MACHINE.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the records of a stream mean, through <ksp/records.hpp> alone.
 
 #include "ksp/records.hpp"

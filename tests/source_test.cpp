@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Where kspdump's captures come from: what is found in which order, what is refused, what is never mistaken.
 
 #include <archive.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Writes example captures: all keys, counters that grow from one day to the next, histograms with a shape, a
 // day of snapshots. The same seed gives the same bytes everywhere.
 

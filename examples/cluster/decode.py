@@ -1,4 +1,5 @@
 #!/usr/bin/python3
+# SPDX-License-Identifier: Apache-2.0
 """Decodes a fleet's captures with kspdump on a Dask cluster and leaves a table of JSON documents.
 
 Sources and the table's folder must have the same names on this machine and on the workers. The table is

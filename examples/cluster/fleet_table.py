@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Reads the table that decode.py leaves: one statistic of a whole fleet as a pandas data frame.
 
 In a notebook: sys.path.append("…/examples/cluster"); from fleet_table import statistic

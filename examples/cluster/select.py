@@ -1,4 +1,5 @@
 #!/usr/bin/python3
+# SPDX-License-Identifier: Apache-2.0
 """Shows one statistic of a whole fleet from the table that decode.py leaves: its least and greatest values and
 percentiles, every value, or the units whose value moved most between two days.
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #ifndef KSP_API_H
 #define KSP_API_H
 

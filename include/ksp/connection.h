@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #ifndef KSP_CONNECTION_H
 #define KSP_CONNECTION_H
 

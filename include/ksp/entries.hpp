@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #ifndef KSP_ENTRIES_HPP
 #define KSP_ENTRIES_HPP
 

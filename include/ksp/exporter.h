@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #ifndef KSP_EXPORTER_H
 #define KSP_EXPORTER_H
 

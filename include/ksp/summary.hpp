@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #ifndef KSP_SUMMARY_HPP
 #define KSP_SUMMARY_HPP
 

@@ -1,4 +1,5 @@
 #!/usr/bin/python3
+# SPDX-License-Identifier: Apache-2.0
 """Opens the pages that kspdump makes in a real browser, and uses them as people do.
 
 usage: pages_test.py KSPDUMP CAPTURES [UNITTEST ARGUMENT...]

@@ -1,4 +1,5 @@
 #!/usr/bin/python3
+# SPDX-License-Identifier: Apache-2.0
 """cluster_test.py KSPDUMP CAPTURE_GENERATOR CAPTURES PROGRAMS: the programs on a real scheduler and two workers."""
 
 import csv

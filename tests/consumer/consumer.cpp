@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Decodes a statistics capture and looks the controller up, as a client in C++.
 
 #include <ksp/ksp.h>

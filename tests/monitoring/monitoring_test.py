@@ -1,4 +1,5 @@
 #!/usr/bin/python3
+# SPDX-License-Identifier: Apache-2.0
 """monitoring_test.py KSPDUMP CAPTURES RECIPE: a device's captures, through the real exporter, asked of a real
 Prometheus server."""
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Captures of a source shown by several threads, and told of in their order.
 #pragma once
 

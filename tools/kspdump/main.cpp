@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // kspdump: decodes captures of the controller's exports for people and programs. This file reads the command
 // line.
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The way of a capture through the rooms: from its source by way of a decoder and a view to the output.
 
 #include "tools/kspdump/run.h"

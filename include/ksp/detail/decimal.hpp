@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #ifndef KSP_DETAIL_DECIMAL_HPP
 #define KSP_DETAIL_DECIMAL_HPP
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The media statistics stream.
 
 #include "tools/kspdump/decode/stream.h"

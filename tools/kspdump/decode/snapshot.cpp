@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Timed snapshots: the fixed layout, or one that a header describes.
 
 #include "tools/kspdump/decode/snapshot.h"

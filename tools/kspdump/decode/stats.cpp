@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The statistics stream, and the summary block that is copied from it.
 
 #include <map>

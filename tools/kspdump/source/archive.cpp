@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include <archive.h>
 #include <archive_entry.h>
 #include <zlib.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Where captures come from: files, folders, archives, lists of names, standard input.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Bytes on their way from a file or through a decompressor.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A line a value: least, mean, greatest, and how it went over the points of a series.
 
 #include <algorithm>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Comma-separated values: a row a value or, of a series, a row a point.
 
 #include <map>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Pages for a browser: one file that needs nothing else, and shows its tables without scripts too.
 
 #include <algorithm>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // JSON: a document a line and a capture, or one for a difference.
 
 #include <array>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // One exposition for monitoring systems: a metric family a kind, the controller's names as a label.
 
 #include <algorithm>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The controller's own text report of a snapshot.
 
 #include <algorithm>

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # Writes OUTPUT: a C++ source with the page's files (in FOLDER), the chart library's script (CHARTS) and its
 # style (CHARTS_STYLE) as `page.h` declares them.
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Makes the page's tables and charts answer: filter, sort, open a row's picture, read values off.
 //
 // A section of the page is what was read together. It tells its `points` (captures or intervals) in a JSON block,
