@@ -399,8 +399,8 @@ TEST_F(Kspdump, SnapshotsAreSeriesInTheOrderOfTime) {
   // A ring: the oldest record stands behind the newest, and one slot is not in use yet.
   const auto at = [](uint64_t time, uint64_t hostWrites, uint64_t mediaWrites) {
     std::string bytes = interval(time);
-    bytes.replace(4 * 28, 4, numbers<4>({hostWrites}));
-    bytes.replace(4 * 30, 4, numbers<4>({mediaWrites}));
+    bytes.replace(size_t{4} * 28, 4, numbers<4>({hostWrites}));
+    bytes.replace(size_t{4} * 30, 4, numbers<4>({mediaWrites}));
     return bytes;
   };
   write("ring", at(30, 4, 2) + at(40, 2, 8) + at(10, 0, 0) + at(20, 4, 4) + std::string(252, '\0'));

@@ -29,7 +29,8 @@ void decodeSummary(const Decoding& /*decoding*/, Capture& capture, Collector& co
   ksp::StatisticsRecords records(capture.bytes.data(), capture.bytes.size());
   capture.share = walk(records, capture.bytes, kStatsWords, [&](const ksp::Record& record) {
     const ksp::SummaryField* const field = ksp::findSummaryField(record.key);
-    if (field == nullptr && record.key != ksp::kReadCountHisto) return;
+    const bool isCopied = field != nullptr || record.key == ksp::kReadCountHisto;
+    if (!isCopied || record.row == nullptr) return;
     findSize(capture, record, kStatsWords);
     Values values = valuesOf(capture.bytes, record, kStatsWords);
     if (field != nullptr && field->low != nullptr) {
