@@ -19,7 +19,7 @@
 static uint64_t allocations = 0;
 #ifndef KSP_SANITIZED  // a sanitizer brings a heap of its own
 extern "C" void* __libc_malloc(size_t size);
-extern "C" void* malloc(size_t size) {
+extern "C" [[gnu::visibility("default")]] void* malloc(size_t size) {
   ++allocations;
   return __libc_malloc(size);
 }
