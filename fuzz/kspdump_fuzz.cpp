@@ -44,7 +44,8 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     view->head();
     show(decoding, capture, *view);
     view->tail();
-    if (sink.text.empty()) std::abort();
+    // The report of a snapshot without a record in use is empty.
+    if (sink.text.empty() && form->name != "report") std::abort();
     if (form->name != "json") continue;
     size_t written = 0;
     const auto document = nlohmann::json::parse(sink.text);
