@@ -6,6 +6,7 @@
 #include <span>
 #include <string>
 #include <string_view>
+#include <utility>
 
 #include "tools/kspdump/view/forms.h"
 #include "tools/kspdump/view/text.h"
@@ -102,11 +103,7 @@ class Json : public View {
     const char* separator = "";
     for (const size_t track : series.tracksInOrder()) {
       const Track& about = series.tracks()[track];
-      out.append(separator).append("{\"key\":");
-      separator = ",";
-      appendNumber(out, about.key);
-      out += ",\"name\":";
-      appendJson(out, about.name);
+      openTrack(std::exchange(separator, ","), about);
       appendList(out, "old", about.elements, [&](uint32_t i) { return series.value(track, 0, i); });
       appendList(out, "new", about.elements, [&](uint32_t i) { return series.value(track, 1, i); });
       appendList(out, "delta", about.elements, [&](uint32_t i) { return series.delta(track, i); });
@@ -144,11 +141,7 @@ class Json : public View {
     const char* separator = "";
     for (const size_t track : series.tracksInOrder()) {
       const Track& about = series.tracks()[track];
-      out.append(separator).append("{\"key\":");
-      separator = ",";
-      appendNumber(out, about.key);
-      out += ",\"name\":";
-      appendJson(out, about.name);
+      openTrack(std::exchange(separator, ","), about);
       out += ",\"values\":[";
       for (size_t point = 0; point < series.points(); ++point) {
         if (point != 0) out += ',';
@@ -183,6 +176,15 @@ class Json : public View {
   [[nodiscard]] bool showsFindings() const override { return true; }
 
  private:
+  /// Opens the object of a track, its key and name told.
+  void openTrack(const char* separator, const Track& track) {
+    std::string& out = sink_.text;
+    out.append(separator).append("{\"key\":");
+    appendNumber(out, track.key);
+    out += ",\"name\":";
+    appendJson(out, track.name);
+  }
+
   /// A track at a point: a number or, of an array, a list; null where it is missing.
   void addPoint(const Track& track, const Values& values) {
     std::string& out = sink_.text;
