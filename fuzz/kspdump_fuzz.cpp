@@ -27,12 +27,13 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   Capture capture;
   capture.source = "input";
   capture.bytes = bytes;
+  static Batch batch;
   Series same;
   size_t values = 0;
   for (int twice = 0; twice < 2; ++twice) {
     values = 0;
     same.begin(capture);
-    decode(decoding, capture, [&](std::span<const Record> records) {
+    decode(decoding, capture, batch, [&](std::span<const Record> records) {
       same.records(records);
       for (const Record& record : records) values += record.values.size();
     });
@@ -42,7 +43,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     Sink sink;
     const auto view = form->make({.isSnapshot = isSnapshot}, sink);
     view->head();
-    show(decoding, capture, *view);
+    show(decoding, capture, batch, *view);
     view->tail();
     // The report of a snapshot without a record in use is empty.
     if (sink.text.empty() && form->name != "report") std::abort();

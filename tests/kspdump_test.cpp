@@ -115,6 +115,12 @@ TEST_F(Kspdump, TablesShowArraysAsSumAndPicture) {
   const std::string tail = "\n    4  hostWrites                12\n";
   EXPECT_EQ(shell("LC_ALL=C $KSPDUMP stats h.stats").out, head + "_.:-=+*#@_" + tail);
   EXPECT_EQ(shell("LC_ALL=C.UTF-8 $KSPDUMP stats h.stats").out, head + "·▁▂▃▄▅▆▇█·" + tail);
+  constexpr uint64_t kUnit = uint64_t{1} << 60;
+  write("g.stats",
+        record(14, {0, kUnit, 4 * kUnit, 4 * kUnit + 1, 8 * kUnit}) + record(15, {8000, 1000, 1001}));
+  const std::string pictures = shell("LC_ALL=C $KSPDUMP stats g.stats").out;
+  EXPECT_NE(pictures.find(" 19599665578316398593  _.=+@\n"), std::string::npos) << pictures;
+  EXPECT_NE(pictures.find(" 10001  @.:\n"), std::string::npos) << pictures;
   EXPECT_EQ(run("stats --match '*Reads' a.stats").out.substr(0, 55),
             "a.stats: statistics, 95 bytes, 4 records, 1 shown\n  KEY");
 }

@@ -63,7 +63,7 @@ TEST(Page, ATrendHasItsExtremes) {
   for (const uint64_t value : {1000U, 500U, 12345678U, 0U, 1500U}) {
     unsigned char bytes[sizeof value];
     for (unsigned i = 0; i < sizeof bytes; ++i) bytes[i] = static_cast<unsigned char>(value >> (8 * i));
-    const Record record = {0, 4, false, "a", Values(bytes, 1, sizeof bytes, 8)};
+    const Record record = {0, 4, false, false, "a", Values(bytes, 1, sizeof bytes, 8)};
     series.begin({});
     if (value != 0) series.records({&record, 1});
     series.end({});

@@ -141,8 +141,10 @@ class Captures {
     struct Job {
       std::unique_ptr<View> view;
       Capture capture;
+      Batch batch;
     };
-    const auto job = std::make_shared<Job>(Job{options_.form->make(viewOptions_, lane.sink), {}});
+    const auto job = std::make_shared<Job>();
+    job->view = options_.form->make(viewOptions_, lane.sink);
     return [this, job, &lane](Input& input) {
       if (input.state == Input::State::kFault) return tellFault(lane, input.name, input.fault);
       lane.then([this] { beginOne(); });
@@ -150,7 +152,7 @@ class Captures {
       capture.source = input.name;
       capture.bytes = input.bytes;
       try {
-        kspdump::show(options_.decoding, capture, *job->view);
+        kspdump::show(options_.decoding, capture, job->batch, *job->view);
       } catch (const std::bad_alloc&) {
         // One capture too large does not stop the others.
         capture = {};
@@ -232,7 +234,7 @@ class Row {
     const bool isLeftOut = !options_.over.empty() && !over;
     Series* const series = isLeftOut ? nullptr : &series_;
     if (series != nullptr) series->begin(capture);
-    decode(options_.decoding, capture, [&](std::span<const Record> records) {
+    decode(options_.decoding, capture, batch_, [&](std::span<const Record> records) {
       if (series != nullptr) series->records(records);
     });
     if (isLeftOut) {
@@ -271,11 +273,11 @@ class Row {
 
  private:
   /// The value of the statistic that the series goes over, selected or not.
-  std::optional<uint64_t> valueOver(Capture capture) const {
+  std::optional<uint64_t> valueOver(Capture capture) {
     std::optional<uint64_t> value;
     Decoding all = options_.decoding;
     all.selection = {};
-    decode(all, capture, [&](std::span<const Record> records) {
+    decode(all, capture, batch_, [&](std::span<const Record> records) {
       for (const Record& record : records) {
         if (record.name == options_.over && !record.isArray && !record.values.empty())
           value = record.values[0];
@@ -286,6 +288,7 @@ class Row {
 
   const Options& options_;
   bool showsFindings_;
+  Batch batch_;
   Series series_;
   Over over_;
   std::vector<Capture> leftOut_;

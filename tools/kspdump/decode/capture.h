@@ -88,6 +88,8 @@ struct Record {
   /// The statistic's, or the number of the snapshot's record.
   uint32_t key;
   bool isArray;
+  /// Whether the name is a key table's: printable, the same for all records of the key, and there for good.
+  bool isListed;
   /// One made from the key lives until the next records are handed out, any other as long as the capture.
   std::string_view name;
   Values values;

@@ -8,34 +8,35 @@
 
 namespace kspdump {
 
-void Collector::addNumbered(uint64_t offset, uint32_t key, std::string_view prefix, bool isArray,
-                            const Values& values) {
-  char(&name)[kLongestNumbered] = names_[count_];
+void Collector::addNumbered(Record record, std::string_view prefix) {
+  makeRoom();
+  char(&name)[Batch::kLongestNumbered] = batch_.names_[batch_.count_];
   std::memcpy(name, prefix.data(), prefix.size());
-  const char* const end = std::to_chars(name + prefix.size(), std::end(name), key).ptr;
-  add(offset, key, {name, static_cast<size_t>(end - name)}, isArray, values);
+  const char* const end = std::to_chars(name + prefix.size(), std::end(name), record.key).ptr;
+  record.name = {name, static_cast<size_t>(end - name)};
+  add(record);
 }
 
 void Collector::handOn() {
-  if (count_ != 0) take_({records_.data(), count_});
-  count_ = 0;
+  take_(batch_.records());
+  batch_.count_ = 0;
 }
 
 void Collector::finish() {
-  handOn();
+  if (batch_.count_ != 0) take_(batch_.records());
   for (size_t i = 0; i < used_.size(); ++i) {
     if (!used_[i]) capture_.find(0, selection_.text(i) + " selects nothing");
   }
 }
 
-void decode(const Decoding& decoding, Capture& capture, const TakeRecords& take) {
+void decode(const Decoding& decoding, Capture& capture, Batch& batch, const TakeRecords& take) {
   constexpr void (*kDecoders[])(const Decoding&, Capture&, Collector&) = {decodeStats, decodeSummary,
                                                                           decodeMedia, decodeSnapshot};
   capture.clear();
   capture.kind = decoding.kind;
   capture.header = decoding.header;
   capture.size = capture.bytes.size();
-  Collector collector(capture, decoding, take);
+  Collector collector(capture, decoding, batch, take);
   kDecoders[static_cast<size_t>(decoding.kind)](decoding, capture, collector);
   collector.finish();
   findWrongKind(capture);

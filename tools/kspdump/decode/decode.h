@@ -25,47 +25,69 @@ struct Decoding {
 /// Takes some of a capture's records, in their order; they are gone when it returns.
 using TakeRecords = std::function<void(std::span<const Record>)>;
 
-/// Decodes `capture.bytes` as far as they go, hands the selected records to `take`, some at a time, and names
-/// whatever is wrong with them in the capture.
-void decode(const Decoding& decoding, Capture& capture, const TakeRecords& take);
+/// Records that are handed on at once: all of a usual capture's.
+class Batch {
+ public:
+  Batch() = default;
+  Batch(const Batch&) = delete;
+  Batch& operator=(const Batch&) = delete;
 
-/// Counts and selects records, and hands them on some at a time.
+  [[nodiscard]] std::span<const Record> records() const { return {records_.data(), count_}; }
+
+ private:
+  friend class Collector;
+
+  static constexpr size_t kMost = 1024;
+  static constexpr size_t kLongestNumbered = 24;
+
+  size_t count_ = 0;
+  std::array<Record, kMost> records_;
+  std::array<char[kLongestNumbered], kMost> names_;
+};
+
+/// Decodes `capture.bytes` as far as they go, hands the selected records to `take`, a batch at a time, and
+/// names whatever is wrong with them in the capture. The last ones are in `batch` still when it returns.
+void decode(const Decoding& decoding, Capture& capture, Batch& batch, const TakeRecords& take);
+
+/// Counts and selects records, and hands them on batch by batch.
 class Collector {
  public:
-  Collector(Capture& capture, const Decoding& decoding, const TakeRecords& take)
-      : capture_(capture), selection_(decoding.selection), take_(take), used_(selection_.size()) {}
+  Collector(Capture& capture, const Decoding& decoding, Batch& batch, const TakeRecords& take)
+      : capture_(capture),
+        selection_(decoding.selection),
+        batch_(batch),
+        take_(take),
+        used_(selection_.size()) {
+    batch_.count_ = 0;
+  }
   Collector(const Collector&) = delete;
   Collector& operator=(const Collector&) = delete;
 
-  /// A record whose name lasts.
-  void add(uint64_t offset, uint32_t key, std::string_view name, bool isArray, const Values& values) {
+  void add(const Record& record) {
     ++capture_.recordCount;
-    if (!selection_.isEmpty() && !selection_.selects(name, key, used_)) return;
+    if (!selection_.isEmpty() && !selection_.selects(record.name, record.key, used_)) return;
     ++capture_.shownCount;
-    records_[count_++] = {offset, key, isArray, name, values};
-    if (count_ == kBatch) handOn();
+    makeRoom();
+    batch_.records_[batch_.count_++] = record;
   }
 
   /// A record that is named by its key: `prefix`, of a few characters, and the number.
-  void addNumbered(uint64_t offset, uint32_t key, std::string_view prefix, bool isArray,
-                   const Values& values);
+  void addNumbered(Record record, std::string_view prefix);
 
   /// Hands on the last records, and names what selected none.
   void finish();
 
  private:
+  void makeRoom() {
+    if (batch_.count_ == Batch::kMost) handOn();
+  }
   void handOn();
-
-  static constexpr size_t kBatch = 256;
-  static constexpr size_t kLongestNumbered = 24;
 
   Capture& capture_;
   const Selection& selection_;
+  Batch& batch_;
   const TakeRecords& take_;
   std::vector<bool> used_;
-  size_t count_ = 0;
-  std::array<Record, kBatch> records_;
-  std::array<char[kLongestNumbered], kBatch> names_;
 };
 
 /// A decoder for each kind; `decode` chooses.

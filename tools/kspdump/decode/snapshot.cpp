@@ -273,9 +273,9 @@ void decodeSnapshot(const Decoding& decoding, Capture& capture, Collector& colle
   Layout layout(capture.labels);
   const auto addRecord = [&](uint64_t offset, uint32_t record) {
     for (const Field& field : layout.fields()) {
-      collector.add(
-          offset, record, field.label, field.isArray,
-          Values(records.data() + offset + field.offset, field.count, ksp::kWordBytes, field.stride));
+      const unsigned char* const first = records.data() + offset + field.offset;
+      collector.add({offset, record, field.isArray, false, field.label,
+                     Values(first, field.count, ksp::kWordBytes, field.stride)});
     }
   };
   if (header.empty()) {

@@ -42,12 +42,10 @@ void decodeSummary(const Decoding& /*decoding*/, Capture& capture, Collector& co
       }
       values = low;
     }
-    lastOfKey[record.key] = {record.offset, record.key, field == nullptr, record.row->name, values};
+    lastOfKey[record.key] = {record.offset, record.key, field == nullptr, true, record.row->name, values};
   });
   findEnd(capture, records.ending(), kStatsWords);
-  for (const auto& [key, last] : lastOfKey) {
-    collector.add(last.offset, last.key, last.name, last.isArray, last.values);
-  }
+  for (const auto& [key, last] : lastOfKey) collector.add(last);
 }
 
 }  // namespace kspdump

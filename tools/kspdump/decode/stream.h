@@ -95,9 +95,9 @@ void findEnd(Capture& capture, ksp::Ending ending, const StreamWords& words);
 inline void collect(Collector& collector, const ksp::Record& record, const Values& values) {
   if (values.empty()) return;
   if (record.isListed()) {
-    collector.add(record.offset, record.key, record.row->name, record.isArray, values);
+    collector.add({record.offset, record.key, record.isArray, true, record.row->name, values});
   } else {
-    collector.addNumbered(record.offset, record.key, record.stem, record.isArray, values);
+    collector.addNumbered({record.offset, record.key, record.isArray, false, {}, values}, record.stem);
   }
 }
 

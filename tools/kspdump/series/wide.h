@@ -8,29 +8,21 @@
 namespace kspdump {
 
 /// A signed whole number of 128 bits: wide enough for the sum of any record's values, for the difference of
-/// any two, and for small multiples of these. Exact on every processor.
+/// any two. Exact on every processor.
 class Wide {
  public:
   constexpr Wide() = default;
   constexpr Wide(uint64_t value) : low_(value) {}  // NOLINT(google-explicit-constructor): loses nothing
 
-  constexpr Wide& operator+=(const Wide& other) {
+  constexpr Wide& operator+=(Wide other) {
     low_ += other.low_;
     high_ += other.high_ + (low_ < other.low_ ? 1 : 0);
     return *this;
   }
   constexpr Wide operator-() const { return {~high_ + (low_ == 0 ? 1 : 0), ~low_ + 1}; }
-  constexpr Wide& operator-=(const Wide& other) { return *this += -other; }
+  constexpr Wide& operator-=(Wide other) { return *this += -other; }
   friend constexpr Wide operator+(Wide a, const Wide& b) { return a += b; }
   friend constexpr Wide operator-(Wide a, const Wide& b) { return a -= b; }
-  /// By a small factor.
-  friend constexpr Wide operator*(Wide a, unsigned factor) {
-    Wide product;
-    for (; factor != 0; factor >>= 1, a += a) {
-      if (factor % 2 != 0) product += a;
-    }
-    return product;
-  }
 
   constexpr bool operator==(const Wide&) const = default;
   constexpr std::strong_ordering operator<=>(const Wide& other) const {
@@ -39,6 +31,8 @@ class Wide {
   }
 
   [[nodiscard]] constexpr bool isNegative() const { return static_cast<int64_t>(high_) < 0; }
+  /// The number itself where it is one of 64 bits.
+  [[nodiscard]] constexpr uint64_t low() const { return low_; }
   [[nodiscard]] constexpr Wide magnitude() const { return isNegative() ? -*this : *this; }
 
   /// The nearest that a double comes.

@@ -38,13 +38,18 @@ const Form* findForm(std::string_view name, Subject subject) {
   return nullptr;
 }
 
-void show(const Decoding& decoding, Capture& capture, View& view) {
+void show(const Decoding& decoding, Capture& capture, Batch& batch, View& view) {
   capture.kind = decoding.kind;
-  if (view.measures(capture)) {
-    decode(decoding, capture, [&](std::span<const Record> records) { view.measure(records); });
+  const bool measures = view.measures(capture);
+  if (measures) {
+    decode(decoding, capture, batch, [&](std::span<const Record> records) { view.measure(records); });
   }
   view.begin(capture);
-  decode(decoding, capture, [&](std::span<const Record> records) { view.records(records); });
+  if (measures && batch.records().size() == capture.shownCount) {
+    view.records(batch.records());
+  } else {
+    decode(decoding, capture, batch, [&](std::span<const Record> records) { view.records(records); });
+  }
   view.end(capture);
 }
 

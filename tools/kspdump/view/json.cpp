@@ -8,6 +8,7 @@
 #include <string_view>
 #include <utility>
 
+#include "ksp/detail/key_name.hpp"
 #include "tools/kspdump/view/forms.h"
 #include "tools/kspdump/view/text.h"
 
@@ -72,20 +73,21 @@ class Json : public View {
   void records(std::span<const Record> records) override {
     Appender appender(sink_);
     for (const Record& record : records) {
-      const Head& head = headOf(record);
-      const size_t skipped = hasRecords_ ? 0 : kRecordEnd.size() + 1;
-      if (head.size <= Appender::kShort) {
-        appender.shortText(head.text.data() + skipped, head.size - skipped);
+      if (std::exchange(hasRecords_, true)) appender.text(kBetween);
+      if (record.isListed) {
+        const Head& head = headOf(record);
+        appender.shortText(head.text, head.size);
       } else {
-        appender.text(std::string_view(head.text).substr(skipped));
+        std::string head;
+        appendHead(head, record);
+        appender.text(head);
       }
-      hasRecords_ = true;
       appender.list(record.values);
     }
   }
 
   void end(Capture& capture) override {
-    if (hasRecords_) sink_.text += kRecordEnd;
+    if (hasRecords_) sink_.text += "]}";
     sink_.text += "],";
     appendFindings(sink_.text, "findings", {&capture, 1});
     sink_.text += "}\n";
@@ -200,29 +202,33 @@ class Json : public View {
     if (track.isArray) out += ']';
   }
 
-  static constexpr std::string_view kRecordEnd = "]}";
+  static constexpr std::string_view kBetween = "]},";
 
-  /// What stands between the values of a record and those of the one before, kept for the next capture's
-  /// records of the same name and key.
+  /// What stands in front of a record's values.
+  static void appendHead(std::string& out, const Record& record) {
+    out += "{\"key\":";
+    appendNumber(out, record.key);
+    out += ",\"name\":";
+    appendJson(out, record.name);
+    out += ",\"values\":[";
+  }
+
+  /// That of a listed key, kept for the next capture.
+  static constexpr std::string_view kLongestAround = R"({"key":4294967295,"name":"","values":[)";
+  static_assert(kLongestAround.size() + ksp::KeyName::kRoom <= Appender::kShort);
   struct Head {
     uint32_t key = 0;
-    std::string name;
-    /// `size` characters, and zeros behind a short one for it to be copied at a constant size.
-    std::string text;
-    size_t size = 0;
+    uint32_t size = 0;
+    char text[Appender::kShort] = {};
   };
 
   const Head& headOf(const Record& record) {
     Head& head = heads_[record.key % heads_.size()];
-    if (head.text.empty() || head.key != record.key || head.name != record.name) {
-      std::string text = std::string(kRecordEnd) + ",{\"key\":";
-      appendNumber(text, record.key);
-      text += ",\"name\":";
-      appendJson(text, record.name);
-      text += ",\"values\":[";
-      const size_t size = text.size();
-      if (size <= Appender::kShort) text.resize(kRecordEnd.size() + 1 + Appender::kShort);
-      head = {record.key, std::string(record.name), std::move(text), size};
+    if (head.size == 0 || head.key != record.key) {
+      std::string text;
+      appendHead(text, record);
+      head.key = record.key;
+      head.size = static_cast<uint32_t>(text.copy(head.text, sizeof head.text));
     }
     return head;
   }

@@ -120,6 +120,7 @@ class Metrics : public View {
       add({.offset = 0,
            .key = 0,
            .isArray = tracks[track].isArray,
+           .isListed = false,
            .name = tracks[track].name,
            .values = values});
     }

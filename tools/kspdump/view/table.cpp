@@ -2,7 +2,7 @@
 // Tables for people.
 
 #include <algorithm>
-#include <array>
+#include <cstddef>
 #include <optional>
 #include <string>
 #include <vector>
@@ -41,7 +41,7 @@ class Table : public View {
   void measure(std::span<const Record> records) override {
     for (const Record& record : records) {
       greatestKey_ = std::max(greatestKey_, record.key);
-      nameWidth_ = std::max(nameWidth_, shownName(record).columns);
+      nameWidth_ = std::max(nameWidth_, record.isListed ? record.name.size() : columnsOf(shown(record.name)));
       if (const auto total = narrowSum(record.values)) {
         greatestNarrow_ = std::max(greatestNarrow_, *total);
       } else {
@@ -75,6 +75,7 @@ class Table : public View {
     }
     const size_t used = nameWidth_ + numbers - kLeastBars;
     barWidth_ = std::max(options_.width, used + kLeastBars) - used;
+    valueEnd_ = keyWidth_ + kGap + nameWidth_ + kGap + valueWidth_;
     appendPadded(out, kKeyHead, keyWidth_, true);
     out.append(kGap, ' ');
     appendPadded(out, kNameHead, nameWidth_, false);
@@ -87,22 +88,21 @@ class Table : public View {
     std::string& out = sink_.text;
     for (const Record& record : records) {
       const std::optional<uint64_t> narrow = narrowSum(record.values);
-      addNumber(record.key, keyWidth_);
-      out.append(kGap, ' ');
-      if (const ShownName& name = shownName(record); name.columns <= nameWidth_) {
-        out.append(name.text).append(nameWidth_ - name.columns + kGap, ' ');
+      if (record.isListed && record.name.size() <= nameWidth_ && narrow) {
+        // The usual row: spaces, and over them what is known to fit.
+        const size_t begin = out.size();
+        out.append(valueEnd_ + (record.isArray ? kGap : 0), ' ');
+        char* const row = out.data() + begin;
+        putNumber(row + keyWidth_, record.key);
+        record.name.copy(row + keyWidth_ + kGap, record.name.size());
+        putNumber(row + valueEnd_, *narrow);
       } else {
-        addCell(cutTo(name.text, nameWidth_), nameWidth_, false);
-      }
-      if (narrow) {
-        addNumber(*narrow, valueWidth_);
-      } else {
+        addCell(std::to_string(record.key), keyWidth_, true);
+        addCell(cutTo(shown(record.name), nameWidth_), nameWidth_, false);
         appendPadded(out, sum(record.values).text(), valueWidth_, true);
+        if (record.isArray) out.append(kGap, ' ');
       }
-      if (record.isArray) {
-        out.append(kGap, ' ');
-        addBars(record.values, narrow);
-      }
+      if (record.isArray) appendBars(out, record.values, barWidth_);
       out += '\n';
       if (expands_ && record.isArray) addElements(record.values, sum(record.values));
       sink_.offer();
@@ -163,19 +163,6 @@ class Table : public View {
     }
   }
 
-  void addBars(const Values& values, std::optional<uint64_t> total) {
-    if (total && *total <= UINT64_MAX / kBarLevels) {
-      narrow_.resize(values.size());
-      uint64_t* to = narrow_.data();
-      values.forEach(0, values.size(), [&](uint64_t value) { *to++ = value; });
-      appendBars<uint64_t>(sink_.text, narrow_, barWidth_);
-    } else {
-      wide_.clear();
-      for (uint32_t i = 0; i < values.size(); ++i) wide_.emplace_back(values[i]);
-      appendBars<Wide>(sink_.text, wide_, barWidth_);
-    }
-  }
-
   /// The sum of values, where 64 bits hold it.
   static std::optional<uint64_t> narrowSum(const Values& values) {
     uint64_t sum = 0;
@@ -188,27 +175,11 @@ class Table : public View {
     return sum;
   }
 
-  void addNumber(uint64_t number, size_t width) {
+  /// Writes a number that ends in front of `end`, with room for it there.
+  static void putNumber(char* end, uint64_t number) {
     char text[ksp::kDecimalRoom];
-    const auto size = static_cast<size_t>(ksp::writeDecimal(text, number) - text);
-    sink_.text.append(width > size ? width - size : 0, ' ').append(text, size);
-  }
-
-  /// A name as it is shown, kept for the next capture's records of the same name and key.
-  struct ShownName {
-    uint32_t key = 0;
-    std::string name;
-    std::string text;
-    size_t columns = 0;
-  };
-
-  const ShownName& shownName(const Record& record) {
-    ShownName& shownName = shownNames_[record.key % shownNames_.size()];
-    if (shownName.text.empty() || shownName.key != record.key || shownName.name != record.name) {
-      const std::string text = shown(record.name);
-      shownName = {record.key, std::string(record.name), text, columnsOf(text)};
-    }
-    return shownName;
+    const std::ptrdiff_t size = ksp::writeDecimal(text, number) - text;
+    std::copy_n(text, size, end - size);
   }
 
   ViewOptions options_;
@@ -221,9 +192,8 @@ class Table : public View {
   size_t keyWidth_ = 0;
   size_t valueWidth_ = 0;
   size_t barWidth_ = 0;
-  std::array<ShownName, 1024> shownNames_;
-  std::vector<uint64_t> narrow_;
-  std::vector<Wide> wide_;
+  /// Where the values' column ends.
+  size_t valueEnd_ = 0;
 };
 
 void Table::difference(const Series& series) {
@@ -240,11 +210,11 @@ void Table::difference(const Series& series) {
   addRows(grid, "ELEMENTS", [&](size_t row, size_t width) {
     const Track& track = series.tracks()[tracks[row]];
     if (!track.isArray) return;
-    wide_.clear();
+    std::vector<Wide> changes;
     for (uint32_t i = 0; i < track.elements; ++i) {
-      wide_.push_back(series.delta(tracks[row], i).value_or(Wide()));
+      changes.push_back(series.delta(tracks[row], i).value_or(Wide()));
     }
-    appendChanges(sink_.text, wide_, width);
+    appendChanges(sink_.text, changes, width);
   });
   appendFindings(out, series);
 }

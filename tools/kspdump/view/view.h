@@ -98,7 +98,7 @@ std::vector<const Form*> formsFor(Subject subject);
 /// The form of this name; null where there is none for the subject.
 const Form* findForm(std::string_view name, Subject subject);
 
-/// Decodes a capture and shows it.
-void show(const Decoding& decoding, Capture& capture, View& view);
+/// Decodes a capture and shows it. `batch` may serve one capture after another.
+void show(const Decoding& decoding, Capture& capture, Batch& batch, View& view);
 
 }  // namespace kspdump
