@@ -187,7 +187,7 @@ TEST_F(Kspdump, FindingsNameOffsetAndReason) {
       {"media", media(4096, value.substr(1)),
        "offset 0: passWithTmodeHard(4096) carries 3 bytes, 4 configured", 0},
       {"media", soundMedia + media(9, value + "ab"),
-       "offset 20: Media_9(9) carries 6 bytes, of which the last 2 fill no element of 4", 2},
+       "offset 20: Media_9(9) carries 6 bytes, 2 left over, fewer than an element of 4", 2},
       {"media", soundMedia + media(0x2FFF, value) + "\1",
        "offset 28: 1 byte behind the end record that is not zero, and not read", 1},
       {"media", sound, "offset 0: looks like statistics, 100 % recognised", 0},

@@ -12,8 +12,9 @@ void tellSize(Capture& capture, ksp::Record record, const StreamWords& words) {
   if (!record.isAsConfigured()) {
     capture.find(record.offset, title + ", " + to_string(record.configured) + " configured");
   } else {
-    capture.find(record.offset, title + ", of which the last " + to_string(leftOver(record, words)) +
-                                    " fill no element of " + to_string(record.elements.width()));
+    capture.find(record.offset, title + ", " + to_string(leftOver(record, words)) +
+                                    " left over, fewer than an element of " +
+                                    to_string(record.elements.width()));
   }
 }
 
