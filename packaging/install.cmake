@@ -50,4 +50,5 @@ install(DIRECTORY examples/captures DESTINATION ${documents}/kspdump/examples
         PATTERN generate.cpp EXCLUDE)
 install(DIRECTORY examples/cluster examples/monitoring DESTINATION ${documents}/kspdump/examples
         USE_SOURCE_PERMISSIONS PATTERN __pycache__ EXCLUDE)
+install(DIRECTORY examples/client DESTINATION ${documents}/libksp-dev/examples)
 install(FILES platform/README.md DESTINATION ${documents}/libksp-dev RENAME porting.md)
