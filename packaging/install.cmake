@@ -3,6 +3,9 @@
 
 include(CMakePackageConfigHelpers)
 
+# What is written below names the prefix, so it counts from the root even where it was given from here.
+install(CODE "get_filename_component(CMAKE_INSTALL_PREFIX \"\${CMAKE_INSTALL_PREFIX}\" ABSOLUTE)")
+
 set_property(TARGET kspplatform PROPERTY EXPORT_NAME platform)
 install(TARGETS ksp kspplatform EXPORT kspTargets)
 install(TARGETS brellium RUNTIME DESTINATION ${CMAKE_INSTALL_SBINDIR})
