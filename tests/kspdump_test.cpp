@@ -92,13 +92,13 @@ TEST_F(Kspdump, JsonKeepsEveryRecordInOrderAndExact) {
               {"key":4,"name":"hostWrites","values":[5]}]})"));
   EXPECT_EQ(std::count(result.out.begin(), result.out.end(), '\n'), 1);
 
-  // More than are rendered at a time.
+  // More text than is written at a time.
   std::string many;
-  for (uint64_t i = 0; i < 70000; ++i) many += record(4, {i});
+  for (uint64_t i = 0; i < 5000; ++i) many += record(4, {i});
   write("many.stats", many);
   const json records = json::parse(run("stats --format json many.stats").out)["records"];
-  ASSERT_EQ(records.size(), 70000u);
-  EXPECT_EQ(records[65536]["values"], json::parse("[65536]"));
+  ASSERT_EQ(records.size(), 5000u);
+  for (uint64_t i = 0; i < 5000; ++i) EXPECT_EQ(records[i]["values"], json({i}));
 
   write("n.stats", record(298, {7, 9}));
   EXPECT_EQ(json::parse(run("stats --numbers --format json n.stats").out)["records"],
@@ -218,7 +218,7 @@ TEST_F(Kspdump, ManyFilesComeOutInOrderWhateverTheJobs) {
   for (int i = 0; i < 60; ++i) {
     const std::string name = "f" + std::to_string(i);
     std::string bytes;
-    for (int k = 0; k < (i % 7) * 400; ++k) bytes += record(4, {static_cast<uint64_t>(i)});
+    for (int k = 0; k < (i % 7) * 100; ++k) bytes += record(4, {static_cast<uint64_t>(i)});
     write(name, bytes + record(5, {1}));
     files += " " + name + (i == 30 ? " missing" : "");
   }
@@ -613,16 +613,17 @@ TEST_F(Kspdump, KeysAndKindsAreListed) {
 
 TEST_F(Kspdump, NoiseIsNoSoundCapture) {
   uint64_t state = 1;
-  for (const size_t size : {size_t{64}, size_t{504}, size_t{2520}, size_t{65536}}) {
-    for (int round = 0; round < 20; ++round) {
-      std::string noise;
-      while (noise.size() < size)
-        noise += static_cast<char>((state = state * 6364136223846793005 + 1442695040888963407) >> 56);
-      write("noise", noise);
-      for (const char* kind : {"stats", "summary", "media", "snapshot"}) {
-        ASSERT_EQ(run(std::string(kind) + " --format csv noise").status, 1) << kind << size;
-      }
-    }
+  for (size_t i = 0; i < 40; ++i) {
+    std::string noise(std::vector{64U, 504U, 2520U, 65536U}[i % 4], '\0');
+    for (char& c : noise)
+      c = static_cast<char>((state = state * 6364136223846793005 + 1442695040888963407) >> 56);
+    write(std::to_string(i), noise);
+  }
+  for (const char* command :
+       {"40 $KSPDUMP stats", "40 $KSPDUMP summary", "40 $KSPDUMP media", "1 $KSPDUMP snapshot"}) {
+    const std::string found = "\n" + shell("ls | xargs -n " + std::string(command) + " --format csv").err;
+    for (size_t i = 0; i < 40; ++i)
+      EXPECT_NE(found.find("\nkspdump: " + std::to_string(i) + ": "), found.npos) << command << i;
   }
 }
 
