@@ -42,7 +42,10 @@ TEST(Picture, BarsStandOnNothing) {
       // The least bar is seen, and so is one value of many.
       {{1, 1000}, "up M0 24L0 23L63 23L63 24M64 24L64 0L127 0L127 24\n"},
       {many, "up M126 24L126 0L127 0L127 24\n"}};
-  for (const auto& [values, paths] : cases) EXPECT_EQ(pathsOf(drawBars(values)), paths);
+  for (const auto& each : cases) {
+    const auto valueAt = [&](size_t at) { return each.first[at]; };
+    EXPECT_EQ(pathsOf(drawBars(each.first.size(), valueAt)), each.second);
+  }
 }
 
 TEST(Picture, LinesLoseNoSpike) {

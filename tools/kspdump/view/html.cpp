@@ -356,54 +356,63 @@ class Html : public View {
     uint32_t elements = 0;
     for (const Values& values : points_) elements = std::max(elements, values.size());
     const std::vector<std::string> numbers = numbersOf(about);
-    std::string json = "{\"key\":";
+    beginRow(isArray || isSeries, std::to_string(key), name, numbers, isArray ? std::to_string(elements) : "",
+             pictureOf(about, isArray, elements));
+    std::string& json = sink_.text;
+    json += "{\"key\":";
     appendNumber(json, key);
     json += ",\"name\":";
     appendSafeJson(json, name);
-    appendValues(json, isArray);
-    appendRow(isArray || isSeries, std::to_string(key), name, numbers,
-              isArray ? std::to_string(elements) : "", pictureOf(about, isArray, elements), json);
+    appendValues(isArray);
+    part("row-end");
   }
 
   /// A row that is worked out from two of a snapshot's fields.
   void row(const Ratio& ratio) {
     constexpr int kDecimals = 2;
     drawn_.clear();
-    std::string json = "{\"key\":null,\"name\":";
-    appendSafeJson(json, ratio.name);
-    json += ",\"values\":[";
     double least = std::numeric_limits<double>::infinity();
     double greatest = -least;
     for (size_t point = 0; point < series_.points(); ++point) {
       const auto value = ratioAt(series_, ratio, point);
       drawn_.push_back(value.value_or(kMissing));
-      if (point != 0) json += ',';
-      json += value ? shortest(*value) : "null";
       least = std::min(least, value.value_or(least));
       greatest = std::max(greatest, value.value_or(greatest));
     }
-    json += "]}";
     const auto overall = ratioOverall(series_, ratio);
     if (!overall) return;
     std::vector<std::string> numbers;
     for (const double number : {drawn_.front(), drawn_.back(), least, *overall, greatest}) {
       numbers.push_back(std::isnan(number) ? "" : rounded(number, kDecimals));
     }
-    appendRow(true, "", ratio.name, numbers, "", drawLine(drawn_), json);
+    beginRow(true, "", ratio.name, numbers, "", drawLine(drawn_));
+    std::string& json = sink_.text;
+    json += "{\"key\":null,\"name\":";
+    appendSafeJson(json, ratio.name);
+    json += ",\"values\":[";
+    for (const double& value : drawn_) {
+      if (&value != &drawn_.front()) json += ',';
+      json += std::isnan(value) ? "null" : shortest(value);
+      sink_.offer();
+    }
+    json += "]}";
+    part("row-end");
   }
 
-  void appendRow(bool opens, std::string_view key, std::string_view name,
-                 const std::vector<std::string>& numbers, std::string_view elements, std::string_view picture,
-                 std::string_view json) {
+  /// A row's cells, up to what the last of them has for the script.
+  void beginRow(bool opens, std::string_view key, std::string_view name,
+                const std::vector<std::string>& numbers, std::string_view elements,
+                std::string_view picture) {
     part("row", {{"class", opens ? "opens" : ""}, {"key", key}, {"name", name}});
     auto column = columns_.begin() + 2;
     for (const std::string& number : numbers) {
       part("number", {{"class", (column++)->classes}, {"number", number, kMarkup}});
     }
-    part("row-end", {{"elements", elements}, {"picture", picture, kMarkup}, {"series", json, kMarkup}});
+    part("picture", {{"elements", elements}, {"picture", picture, kMarkup}});
   }
 
-  void appendValues(std::string& json, bool isArray) {
+  void appendValues(bool isArray) {
+    std::string& json = sink_.text;
     json += ",\"values\":[";
     for (size_t i = 0; i < points_.size(); ++i) {
       const Values& values = points_[i];
@@ -416,6 +425,7 @@ class Html : public View {
       for (uint32_t element = 0; element < values.size(); ++element) {
         if (element != 0) json += ',';
         appendValue(json, values[element]);
+        sink_.offer();
       }
       if (isArray) json += ']';
     }
@@ -471,23 +481,20 @@ class Html : public View {
   }
 
   std::string pictureOf(About about, bool isArray, uint32_t elements) {
-    drawn_.clear();
     if (about == About::kTrend || about == About::kSnapshot) {
+      drawn_.clear();
       for (const auto& total : totals_) drawn_.push_back(total ? static_cast<double>(*total) : kMissing);
       return drawLine(drawn_);
     }
     if (!isArray) return "";
     const Values& from = points_.front();
     const Values& to = points_.back();
-    for (uint32_t i = 0; i < elements; ++i) {
-      if (about == About::kCapture) {
-        drawn_.push_back(static_cast<double>(to[i]));
-      } else {
-        const bool isInBoth = i < from.size() && i < to.size();
-        drawn_.push_back(isInBoth ? static_cast<double>(Wide(to[i]) - Wide(from[i])) : kMissing);
-      }
-    }
-    return drawBars(drawn_);
+    return drawBars(elements, [&](size_t at) {
+      const auto i = static_cast<uint32_t>(at);
+      if (about == About::kCapture) return static_cast<double>(to[i]);
+      const bool isInBoth = i < from.size() && i < to.size();
+      return isInBoth ? static_cast<double>(Wide(to[i]) - Wide(from[i])) : kMissing;
+    });
   }
 
   bool isSnapshot_ = false;

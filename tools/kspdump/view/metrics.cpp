@@ -2,6 +2,9 @@
 // One exposition for monitoring systems: a metric family a kind, the controller's names as a label.
 
 #include <algorithm>
+#include <array>
+#include <bitset>
+#include <memory>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -27,17 +30,25 @@ std::string escaped(std::string_view text) {
   return out;
 }
 
-/// Which record of a key is its last, by the records' places among all.
+/// Which record of a key is its last, by the records' places among all. Keys that come once, which most do,
+/// take a bit each; a bit that two of them share makes none of them wrong.
 class LastOfKeys {
  public:
   void clear() {
+    for (auto& page : seen_) page.reset();
     entries_.clear();
     distinct_ = 0;
   }
 
   /// Places ascend.
   void add(uint32_t key, uint32_t place) {
-    entries_.push_back(uint64_t{key} << 32 | place);
+    auto& page = seen_[key / kPageKeys % kPages];
+    if (page == nullptr) page = std::make_unique<Page>();
+    if (!page->test(key % kPageKeys)) {
+      page->set(key % kPageKeys);
+      return;
+    }
+    entries_.push_back(entry(key, place));
     if (entries_.size() >= std::max(kSmall, 2 * distinct_)) sort();
   }
 
@@ -51,12 +62,19 @@ class LastOfKeys {
 
   /// Behind `sort`.
   [[nodiscard]] bool isLast(uint32_t key, uint32_t place) const {
-    return std::binary_search(entries_.begin(), entries_.end(), uint64_t{key} << 32 | place);
+    const auto at = std::lower_bound(entries_.begin(), entries_.end(), entry(key, 0));
+    return at == entries_.end() || *at >> 32 != key || *at == entry(key, place);
   }
 
  private:
   static constexpr size_t kSmall = 4096;
+  static constexpr size_t kPageKeys = 32768;
+  static constexpr size_t kPages = 2048;
+  using Page = std::bitset<kPageKeys>;
 
+  static uint64_t entry(uint32_t key, uint32_t place) { return uint64_t{key} << 32 | place; }
+
+  std::array<std::unique_ptr<Page>, kPages> seen_;
   std::vector<uint64_t> entries_;
   size_t distinct_ = 0;
 };
@@ -92,6 +110,7 @@ class Metrics : public View {
     for (const Record& record : records) {
       if (last_.isLast(record.key, place_++)) {
         add(record);
+        sink_.offer();
       } else if (repeated_.size() < kMostRepeated) {
         repeated_.push_back({record.offset, std::string(record.name) + "(" + std::to_string(record.key) +
                                                 ") comes again; its last record stands"});

@@ -32,31 +32,33 @@ std::string picture(std::string_view paths) {
 
 }  // namespace
 
-std::string drawBars(const std::vector<double>& values) {
+std::string drawBars(size_t count, const std::function<double(size_t)>& valueAt) {
   constexpr size_t kMostBars = 64;
   double greatest = 0;
   double least = 0;
-  for (const double value : values) {
+  for (size_t at = 0; at < count; ++at) {
+    const double value = valueAt(at);
     greatest = std::max(greatest, value);
     least = std::min(least, value);
   }
   const double range = greatest > least ? greatest - least : 1;
   const double base = kHeight * greatest / range;
-  const size_t count = std::min(values.size(), kMostBars);
-  const double step = static_cast<double>(kWidth) / static_cast<double>(count);
+  const size_t bars = std::min(count, kMostBars);
+  const double step = static_cast<double>(kWidth) / static_cast<double>(bars);
   std::string up;
   std::string down;
-  for (size_t i = 0; i < count; ++i) {
+  for (size_t bar = 0; bar < bars; ++bar) {
     // Where there are more values than bars, a bar shows the one farthest from nothing.
     double value = 0;
-    for (size_t at = i * values.size() / count; at < (i + 1) * values.size() / count; ++at) {
-      if (std::abs(values[at]) > std::abs(value)) value = values[at];
+    for (size_t at = bar * count / bars; at < (bar + 1) * count / bars; ++at) {
+      const double each = valueAt(at);
+      if (std::abs(each) > std::abs(value)) value = each;
     }
     if (value == 0 || std::isnan(value)) continue;
     std::string& path = value > 0 ? up : down;
     // What is there at all is seen.
     const double height = std::max(std::abs(value) * kHeight / range, 1.0);
-    const double left = static_cast<double>(i) * step;
+    const double left = static_cast<double>(bar) * step;
     appendPoint(path, 'M', left, base);
     appendPoint(path, 'L', left, value > 0 ? base - height : base + height);
     appendPoint(path, 'L', left + std::max(step - 1, 1.0), value > 0 ? base - height : base + height);
