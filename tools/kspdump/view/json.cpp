@@ -46,16 +46,6 @@ void appendFindings(std::string& out, std::string_view member, std::span<const C
   }
 }
 
-template <class ValueAt>
-void appendList(std::string& out, const char* member, uint32_t count, ValueAt valueAt) {
-  out.append(",\"").append(member).append("\":[");
-  for (uint32_t i = 0; i < count; ++i) {
-    const auto value = valueAt(i);
-    out.append(i == 0 ? "" : ",").append(value ? Wide(*value).text() : "null");
-  }
-  out += ']';
-}
-
 class Json : public View {
  public:
   using View::View;
@@ -106,11 +96,10 @@ class Json : public View {
     for (const size_t track : series.tracksInOrder()) {
       const Track& about = series.tracks()[track];
       openTrack(std::exchange(separator, ","), about);
-      appendList(out, "old", about.elements, [&](uint32_t i) { return series.value(track, 0, i); });
-      appendList(out, "new", about.elements, [&](uint32_t i) { return series.value(track, 1, i); });
-      appendList(out, "delta", about.elements, [&](uint32_t i) { return series.delta(track, i); });
+      addList("old", about.elements, [&](uint32_t i) { return series.value(track, 0, i); });
+      addList("new", about.elements, [&](uint32_t i) { return series.value(track, 1, i); });
+      addList("delta", about.elements, [&](uint32_t i) { return series.delta(track, i); });
       out += '}';
-      sink_.offer();
     }
     out += "],";
     appendFindings(out, "old_findings", {&before, 1});
@@ -187,6 +176,18 @@ class Json : public View {
     appendJson(out, track.name);
   }
 
+  template <class ValueAt>
+  void addList(const char* member, uint32_t count, ValueAt valueAt) {
+    std::string& out = sink_.text;
+    out.append(",\"").append(member).append("\":[");
+    for (uint32_t i = 0; i < count; ++i) {
+      const auto value = valueAt(i);
+      out.append(i == 0 ? "" : ",").append(value ? Wide(*value).text() : "null");
+      sink_.offer();
+    }
+    out += ']';
+  }
+
   /// A track at a point: a number or, of an array, a list; null where it is missing.
   void addPoint(const Track& track, const Values& values) {
     std::string& out = sink_.text;
@@ -198,6 +199,7 @@ class Json : public View {
     for (uint32_t i = 0; i < values.size(); ++i) {
       if (i != 0) out += ',';
       appendNumber(out, values[i]);
+      sink_.offer();
     }
     if (track.isArray) out += ']';
   }
