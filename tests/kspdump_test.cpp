@@ -23,12 +23,11 @@ class Kspdump : public FolderTest {
   /// What a command of the shell says in the folder `in`, a line each, as the cases have it.
   std::deque<std::string> said(const std::string& command) const {
     setenv("COMMAND", command.c_str(), 1);
-    // NOLINTNEXTLINE(cert-env33-c): a shell is where people run it
-    const int status =
-        std::system(("cd '" + path("in") +
-                     "' && PATH=" KSP_PROGRAMS ":$PATH CAPTURES=" KSP_EXAMPLE_CAPTURES " DATA=" KSP_TEST_DATA
-                     " LC_ALL=C bash -o pipefail -c \"$COMMAND\" >../out 2>../err")
-                        .c_str());
+    const std::string shell = "cd '" + path("in") +
+                              "' && PATH=" KSP_PROGRAMS ":$PATH CAPTURES=" KSP_EXAMPLE_CAPTURES
+                              " DATA=" KSP_TEST_DATA
+                              " LC_ALL=C bash -o pipefail -c \"$COMMAND\" >../out 2>../err";
+    const int status = std::system(shell.c_str());  // NOLINT(cert-env33-c): a shell is where people run it
     std::deque<std::string> lines;
     for (const auto& [mark, text] : {std::pair(std::string(), read("out")), {"2> ", read("err")}}) {
       std::istringstream stream(text);
