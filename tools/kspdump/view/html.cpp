@@ -333,6 +333,7 @@ class Html : public View {
   void snapshot() {
     constexpr uint32_t kMostLines = 16;
     beginSection(About::kSnapshot, series_.captures().front().source, series_.captures());
+    if (series_.points() == 0) return;
     for (size_t track = 0; track < series_.tracks().size(); ++track) {
       const Track& of = series_.tracks()[track];
       const bool isApart = of.isArray && of.elements <= kMostLines;
@@ -346,7 +347,6 @@ class Html : public View {
             of.isArray && !isApart);
       }
     }
-    if (series_.points() == 0) return;
     for (const Ratio& ratio : ratiosOf(series_)) row(ratio);
   }
 
