@@ -389,7 +389,7 @@ TEST_F(Brellium, WhatTheSystemRefusesEndsWithALineAndItsStatus) {
 
 TEST_F(Brellium, KeepsItsMetrics) {
   Daemon daemon(measuredHost("prom",
-                             "interval_s = 1\n[yield]\nat_check = 8\n[[controller]]\n"
+                             "interval_s = 1000\n[yield]\nat_check = 8\n[[controller]]\n"
                              "class = \"KSPStorage\"\nsteps = [1, 1, {reply = 1, result = 7}]"));
   daemon.allLines("  - defer chck 1/6");
   expectSamples("prom", {"brellium_steps_total{result=\"pass\"} 1"});
@@ -401,7 +401,7 @@ TEST_F(Brellium, KeepsItsMetrics) {
   const double lasted = std::stod(afterFirst.substr(afterFirst.find("\nbrellium_run_seconds_total ") + 28));
   EXPECT_GE(lasted, 35);
   EXPECT_LT(lasted, 350);
-  daemon.allLines("host: next run in 1 s");
+  daemon.allLines("host: next run in 1000 s");
   expectSamples("prom", {"brellium_runs_total 2", "brellium_steps_total{result=\"fail\"} 1"});
   const std::string afterSecond = read("prom");
   const long finish = std::stol(afterSecond.substr(afterSecond.rfind(' ')));
