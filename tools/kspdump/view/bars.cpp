@@ -82,8 +82,8 @@ class Scale {
 
 /// Where there are more values than columns, the first of a column's share; each column shows the greatest of
 /// its.
-size_t shareOf(size_t column, size_t columns, size_t values) {
-  return column * values / columns;
+size_t shareOf(uint64_t column, size_t columns, size_t values) {
+  return static_cast<size_t>(column * values / columns);
 }
 
 }  // namespace

@@ -14,6 +14,7 @@ namespace kspdump {
 
 /// The fewest columns that a picture has.
 inline constexpr size_t kLeastBars = 8;
+
 /// Appends a bar from the left, as long as `value` is of `largest`, which has `width` columns.
 void appendBar(std::string& out, uint64_t value, uint64_t largest, size_t width);
 

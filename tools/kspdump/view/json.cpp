@@ -215,9 +215,10 @@ class Json : public View {
     out += ",\"values\":[";
   }
 
-  /// That of a listed key, kept for the next capture.
   static constexpr std::string_view kLongestAround = R"({"key":4294967295,"name":"","values":[)";
   static_assert(kLongestAround.size() + ksp::KeyName::kRoom <= Appender::kShort);
+
+  /// That of a listed key, kept for the next capture.
   struct Head {
     uint32_t key = 0;
     uint32_t size = 0;
