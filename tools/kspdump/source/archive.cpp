@@ -70,10 +70,8 @@ class Reader {
     check(enable(packing));
     check(archive_read_set_callback_data(archive(), this));
     check(archive_read_set_read_callback(archive(), refill));
-    if (canSeek()) {
-      check(archive_read_set_skip_callback(archive(), skip));
-      check(archive_read_set_seek_callback(archive(), seek));
-    }
+    // The library passes over what is large by it, too.
+    if (canSeek()) check(archive_read_set_seek_callback(archive(), seek));
     check(archive_read_open1(archive()));
   }
 
@@ -183,21 +181,11 @@ class Reader {
     Reader& self = *static_cast<Reader*>(data);
     const uint64_t size = self.stream_->size();
     const uint64_t from = whence == SEEK_SET ? 0 : whence == SEEK_CUR ? self.at_ : size;
-    const uint64_t back = offset < 0 ? 0 - static_cast<uint64_t>(offset) : 0;
-    if (back > from) return ARCHIVE_FATAL;
-    const uint64_t to = offset < 0 ? from - back : from + static_cast<uint64_t>(offset);
+    const uint64_t to =
+        from + static_cast<uint64_t>(offset);  // far behind the end where it is before the start
     if (to > size || !self.stream_->seek(to)) return ARCHIVE_FATAL;
     self.at_ = to;
     return static_cast<la_int64_t>(to);
-  }
-
-  static la_int64_t skip(struct archive*, void* data, la_int64_t request) {
-    Reader& self = *static_cast<Reader*>(data);
-    const uint64_t left = self.stream_->size() - std::min(self.at_, self.stream_->size());
-    const uint64_t step = std::min(left, static_cast<uint64_t>(std::max<la_int64_t>(request, 0)));
-    if (step == 0 || !self.stream_->seek(self.at_ + step)) return 0;
-    self.at_ += step;
-    return static_cast<la_int64_t>(step);
   }
 
   struct Free {
@@ -333,23 +321,14 @@ class Archive : public Source {
   }
 
   void readMember(archive_entry* entry, Input& input) {
-    // What a header says of the size is no reason to take as much memory.
-    constexpr uint64_t kMostAtOnce = uint64_t{1} << 20;
     const la_int64_t told = archive_entry_size_is_set(entry) != 0 ? archive_entry_size(entry) : 0;
-    const uint64_t size = told < 0 ? 0 : static_cast<uint64_t>(told);
-    Buffer& bytes = input.bytes;
-    for (;;) {
-      if (std::max<uint64_t>(size, bytes.size()) > greatest_) {
-        // To pass over what is compressed is to unpack it.
-        isOver_ = !reader_.canSeek();
-        throw ReadFault(largerThan(greatest_));
-      }
-      const uint64_t left = size > bytes.size() ? size - bytes.size() : 0;
-      const auto count = static_cast<size_t>(
-          std::clamp(left + 1, uint64_t{1} << 12, std::min(kMostAtOnce, greatest_ + 1 - bytes.size())));
-      const size_t got = reader_.read(bytes.room(count), count);
-      if (got == 0) break;
-      bytes.added(got);
+    try {
+      readAll([this](unsigned char* out, size_t size) { return reader_.read(out, size); },
+              static_cast<uint64_t>(std::max<la_int64_t>(told, 0)), greatest_, input.bytes);
+    } catch (const TooLarge&) {
+      // To pass over what is compressed is to unpack it.
+      isOver_ = !reader_.canSeek();
+      throw;
     }
     input.state = Input::State::kRead;
   }

@@ -103,6 +103,8 @@ void Expansion::gave(uint64_t bytes) {
   }
 }
 
+namespace {
+
 std::string largerThan(uint64_t greatest) {
   constexpr const char* kUnits[] = {"bytes", "KiB", "MiB", "GiB"};
   size_t unit = 0;
@@ -110,19 +112,30 @@ std::string largerThan(uint64_t greatest) {
   return "larger than " + std::to_string(greatest) + " " + kUnits[unit] + " (--max-size)";
 }
 
-void readAll(Stream& stream, uint64_t greatest, Buffer& bytes) {
-  constexpr uint64_t kUsualRead = uint64_t{1} << 16;
-  // Of what is said to follow, and of the most, one byte more, so that their end is seen.
-  const uint64_t expected = stream.size() >= bytes.size() ? stream.size() - bytes.size() + 1 : 1;
-  uint64_t wanted = std::max(expected, kUsualRead);
+}  // namespace
+
+TooLarge::TooLarge(uint64_t greatest) : ReadFault(largerThan(greatest)) {}
+
+void readAll(const std::function<size_t(unsigned char* out, size_t size)>& read, uint64_t told,
+             uint64_t greatest, Buffer& bytes) {
+  // What a header says of a size is no reason to take as much memory.
+  constexpr uint64_t kMostRead = uint64_t{1} << 20;
+  constexpr uint64_t kLeastRead = uint64_t{1} << 12;
   for (;;) {
-    if (bytes.size() > greatest) throw ReadFault(largerThan(greatest));
+    if (std::max<uint64_t>(told, bytes.size()) > greatest) throw TooLarge(greatest);
+    // One byte more, of what is told and of the most, shows that they end there.
+    const uint64_t left = told > bytes.size() ? told - bytes.size() : 0;
+    const uint64_t wanted = std::clamp(std::max<uint64_t>(left + 1, bytes.size() / 4), kLeastRead, kMostRead);
     const auto count = static_cast<size_t>(std::min(wanted, greatest + 1 - bytes.size()));
-    const size_t got = stream.read(bytes.room(count), count);
+    const size_t got = read(bytes.room(count), count);
     if (got == 0) return;
     bytes.added(got);
-    wanted = wanted > got + kUsualRead ? wanted - got : kUsualRead;
   }
+}
+
+void readAll(Stream& stream, uint64_t greatest, Buffer& bytes) {
+  readAll([&](unsigned char* out, size_t size) { return stream.read(out, size); }, stream.size(), greatest,
+          bytes);
 }
 
 }  // namespace kspdump

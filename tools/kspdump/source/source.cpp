@@ -92,10 +92,7 @@ std::unique_ptr<Source> openInput(Input& input, const Reading& reading) {
     input.bytes.clear();
     return unpack(input, std::move(file), packing, reading);
   }
-  if (size > reading.greatest) {
-    if (!input.isFound || reading.keepsOthers || reading.isCapture(input.bytes)) {
-      throw ReadFault(largerThan(reading.greatest));
-    }
+  if (size > reading.greatest && input.isFound && !reading.keepsOthers && !reading.isCapture(input.bytes)) {
     input.state = Input::State::kPassedOver;
     return nullptr;
   }

@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <span>
 #include <stdexcept>
@@ -97,12 +98,18 @@ class Expansion {
   uint64_t given_ = 0;
 };
 
-/// Reads a stream to its end, behind the bytes that are there already. Throws ReadFault, above all when there
-/// are more than `greatest`, and std::bad_alloc.
-void readAll(Stream& stream, uint64_t greatest, Buffer& bytes);
+/// A capture that is larger than `greatest` bytes.
+class TooLarge : public ReadFault {
+ public:
+  explicit TooLarge(uint64_t greatest);
+};
 
-/// "larger than 256 MiB"
-std::string largerThan(uint64_t greatest);
+/// Calls `read(out, size)`, which returns 0 at the end, until then; the bytes come behind those that are
+/// there already. `told` of them are said to be there in all, 0 where nobody knows. Throws TooLarge as soon
+/// as it shows, what `read` throws, and std::bad_alloc.
+void readAll(const std::function<size_t(unsigned char* out, size_t size)>& read, uint64_t told,
+             uint64_t greatest, Buffer& bytes);
+void readAll(Stream& stream, uint64_t greatest, Buffer& bytes);
 
 std::unique_ptr<Source> folderSource(const Input& input);
 
