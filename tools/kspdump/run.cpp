@@ -54,7 +54,7 @@ class Progress {
     if (now - last_ < std::chrono::milliseconds(100)) return;
     last_ = now;
     isShown_ = true;
-    std::fprintf(stderr, "\r%zu captures", done_);
+    std::fprintf(stderr, "\r%s", counted(done_, "capture").c_str());
   }
 
   /// Makes room for other lines.

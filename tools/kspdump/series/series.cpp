@@ -28,7 +28,7 @@ void Series::records(std::span<const Record> records) {
     tracks_[track].isArray |= record.isArray;
     tracks_[track].elements = std::max(tracks_[track].elements, record.values.size());
     std::vector<Cell>& cells = cells_.back();
-    if (cells.size() <= track) cells.resize(std::max(track + 1, tracks_.size()));
+    if (cells.size() <= track) cells.resize(tracks_.size());
     std::vector<unsigned char>& copy = copies_.back();
     cells[track] = {copy.size(), record.values.size(), record.values.width()};
     record.values.copyTo(copy);

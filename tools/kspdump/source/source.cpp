@@ -85,7 +85,7 @@ std::unique_ptr<Source> openInput(Input& input, const Reading& reading) {
   const Packing packing = packingOfOther(input.bytes, reading);
   if (packing != Packing::kNone) {
     // From the start again where that is possible: then the archive can be gone about in.
-    if (size == 0 || !file->seek(0)) {
+    if (!file->seek(0)) {
       return unpack(input, std::make_unique<Rejoined>(std::move(input.bytes), std::move(file)), packing,
                     reading);
     }

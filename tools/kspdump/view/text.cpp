@@ -30,24 +30,19 @@ std::string_view takeCharacter(std::string_view& text, uint32_t& character) {
   };
   constexpr Form kForms[] = {{0, 0x80, 0}, {0x80, 0xE0, 0xC0}, {0x800, 0xF0, 0xE0}, {0x10000, 0xF8, 0xF0}};
   const auto first = static_cast<uint8_t>(text[0]);
-  size_t size = 1;
-  character = kNone;
-  for (size_t length = 1; length <= std::size(kForms) && length <= text.size(); ++length) {
-    const Form& form = kForms[length - 1];
-    if ((first & form.mask) != form.mark) continue;
-    uint32_t number = first & static_cast<uint8_t>(~form.mask);
-    bool isSound = true;
-    for (size_t i = 1; i < length; ++i) {
-      isSound &= (static_cast<uint8_t>(text[i]) & 0xC0) == 0x80;
-      number = number << 6 | (static_cast<uint8_t>(text[i]) & 0x3F);
-    }
-    if (!isSound || number < form.least || number > 0x10FFFF || (number >= 0xD800 && number < 0xE000)) break;
-    character = number;
-    size = length;
-    break;
+  const Form* const form = std::find_if(std::begin(kForms), std::end(kForms),
+                                        [&](const Form& each) { return (first & each.mask) == each.mark; });
+  const auto length = static_cast<size_t>(form - kForms) + 1;
+  bool isSound = form != std::end(kForms) && length <= text.size();
+  uint32_t number = isSound ? first & static_cast<uint8_t>(~form->mask) : 0;
+  for (size_t i = 1; isSound && i < length; ++i) {
+    isSound = (static_cast<uint8_t>(text[i]) & 0xC0) == 0x80;
+    number = number << 6 | (static_cast<uint8_t>(text[i]) & 0x3F);
   }
-  const std::string_view taken = text.substr(0, size);
-  text.remove_prefix(size);
+  isSound = isSound && number >= form->least && number <= 0x10FFFF && (number < 0xD800 || number >= 0xE000);
+  character = isSound ? number : kNone;
+  const std::string_view taken = text.substr(0, isSound ? length : 1);
+  text.remove_prefix(taken.size());
   return taken;
 }
 
