@@ -51,6 +51,9 @@ TEST(Picture, BarsStandOnNothing) {
 TEST(Picture, LinesLoseNoSpike) {
   EXPECT_EQ(pathsOf(drawLine({0, 1, kMissing, 1})), "line M0 23L43 1M128 1\n");
   EXPECT_EQ(pathsOf(drawLine({5, 5})), "line M0 12L128 12\n");
+  std::vector<double> each(100, 1);
+  each[50] = 2;
+  EXPECT_NE(pathsOf(drawLine(each)).find("L63 23L65 1L66 23"), std::string::npos) << "not a point a value";
   std::vector<double> many(10000, 1);
   many[5000] = 9;
   many[7000] = -7;
