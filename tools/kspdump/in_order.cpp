@@ -24,10 +24,8 @@ namespace {
 constexpr uint64_t kBatchBytes = uint64_t{1} << 17;
 constexpr size_t kMostInBatch = 64;
 
-/// Text that may wait for its turn: in one batch, and in all of them.
-constexpr size_t kLeastWaiting = size_t{1} << 16;
-constexpr size_t kMostWaiting = size_t{1} << 20;
-constexpr size_t kMostWaitingInAll = size_t{24} << 20;
+/// Text that may wait for its turn, in all batches.
+constexpr size_t kMostWaiting = size_t{8} << 20;
 
 constexpr size_t kBatchesAJob = 4;
 
@@ -61,8 +59,6 @@ class InOrder {
  public:
   InOrder(std::unique_ptr<Source> source, const Work& work) : work_(work) {
     nodes_.emplace_back().source = std::move(source);
-    const size_t batches = kBatchesAJob * work_.jobs;
-    waiting_ = std::clamp(kMostWaitingInAll / batches, kLeastWaiting, kMostWaiting);
   }
 
   void run() {
@@ -157,7 +153,7 @@ class InOrder {
     void offer() {
       if (all_.first_ == &*batch_) {
         all_.write(lane_.sink.text, lane_.actions_);
-      } else if (lane_.sink.text.size() >= all_.waiting_) {
+      } else if (lane_.sink.text.size() >= kMostWaiting / all_.mostBatches_) {
         all_.waitForTurn(batch_);
         all_.write(lane_.sink.text, lane_.actions_);
       }
@@ -206,7 +202,7 @@ class InOrder {
   /// Finds the first source that a batch may be taken from, with not too many batches before it.
   bool findSource(At& found) {
     size_t batches = 0;
-    for (At at = nodes_.begin(); at != nodes_.end() && batches < kBatchesAJob * work_.jobs; ++at) {
+    for (At at = nodes_.begin(); at != nodes_.end() && batches < mostBatches_; ++at) {
       if (at->source == nullptr) {
         ++batches;
       } else if (!at->isBusy && !at->isDone) {
@@ -346,9 +342,9 @@ class InOrder {
   }
 
   const Work& work_;
+  const size_t mostBatches_ = kBatchesAJob * work_.jobs;
   size_t most_ = work_.jobs;
   size_t running_ = 1;
-  size_t waiting_;
   std::mutex mutex_;
   std::condition_variable changed_;
   std::list<Node> nodes_;
