@@ -134,7 +134,7 @@ class InOrder {
           const bool isOther = input.state == Input::State::kPassedOver;
           ++(isOther ? batch_->tally->passedOver : batch_->tally->captures);
         }
-        if (input.state == Input::State::kRead) all_.noteSize(input.bytes.size());
+        if (input.state == Input::State::kRead) all_.usualBytes_ = input.bytes.size();
         if (input.state != Input::State::kPassedOver) show_(input);
         // One buffer, still in the cache, serves all that are to be read.
         if (i + 1 < count_ && inputs_[i + 1].state == Input::State::kNamed) {
@@ -215,7 +215,6 @@ class InOrder {
 
   /// Takes captures from a source. Returns whether these were its last.
   bool fill(Source& source, std::vector<Input>& inputs, size_t& count) const {
-    const uint64_t usual = usualBytes_;
     uint64_t bytes = 0;
     for (count = 0; count < kMostInBatch && bytes < kBatchBytes; ++count) {
       if (source.isOver()) return true;
@@ -226,15 +225,9 @@ class InOrder {
       } catch (const std::bad_alloc&) {
         input.fail("out of memory");
       }
-      bytes += input.state == Input::State::kNamed ? usual : input.bytes.size();
+      bytes += input.state == Input::State::kNamed ? usualBytes_.load() : input.bytes.size();
     }
     return source.isOver();
-  }
-
-  /// Files that are still to be read are taken to be like those that were.
-  void noteSize(uint64_t bytes) {
-    const uint64_t usual = usualBytes_;
-    usualBytes_ = (3 * usual + std::min(bytes, kBatchBytes)) / 4;
   }
 
   /// A thread more, where there is room for it; called with the lock held.
@@ -349,6 +342,7 @@ class InOrder {
   std::condition_variable changed_;
   std::list<Node> nodes_;
   std::atomic<const Node*> first_ = nullptr;
+  /// Files that are still to be read are taken to be like the last that was.
   std::atomic<uint64_t> usualBytes_ = kBatchBytes;
   bool isWriting_ = false;
   std::exception_ptr failure_;
