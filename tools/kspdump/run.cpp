@@ -158,11 +158,8 @@ class Captures {
         capture = {};
         return tellFault(lane, input.name, "out of memory");
       }
-      if (capture.isClean()) {
-        lane.then([this] { progress_.show(); });
-      } else {
-        tellFindings(lane, capture);
-      }
+      if (!capture.isClean()) tellFindings(lane, capture);
+      lane.then([this] { progress_.show(); });
     };
   }
 
