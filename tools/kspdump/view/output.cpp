@@ -28,12 +28,23 @@ void removeAndEnd(int signal) {
   raise(signal);
 }
 
-void removeOnSignals(const std::string& file) {
-  if (file.size() >= sizeof doomed) return;
-  file.copy(doomed, file.size());
-  for (const int number : {SIGINT, SIGTERM, SIGHUP}) {
-    if (signal(number, removeAndEnd) == SIG_IGN) signal(number, SIG_IGN);
+/// Creates a file by `mkostemp`, which goes with the program where a signal ends it.
+int createDoomed(std::string& file) {
+  constexpr int kEnding[] = {SIGINT, SIGTERM, SIGHUP};
+  sigset_t ending;
+  sigset_t before;
+  sigemptyset(&ending);
+  for (const int number : kEnding) sigaddset(&ending, number);
+  sigprocmask(SIG_BLOCK, &ending, &before);
+  const int descriptor = mkostemp(file.data(), O_CLOEXEC);
+  if (descriptor >= 0 && file.size() < sizeof doomed) {
+    file.copy(doomed, file.size());
+    for (const int number : kEnding) {
+      if (signal(number, removeAndEnd) == SIG_IGN) signal(number, SIG_IGN);
+    }
   }
+  sigprocmask(SIG_SETMASK, &before, nullptr);
+  return descriptor;
 }
 
 /// Whether a path is a way to something that is open already, or to a device.
@@ -60,9 +71,8 @@ Output::Output(std::string path) : path_(path == "-" ? "" : std::move(path)), de
     struct stat existing = {};
     const bool exists = stat(target_.c_str(), &existing) == 0;
     unfinished_ = target_.substr(0, target_.rfind('/') + 1) + ".kspdump-XXXXXX";
-    descriptor_ = mkostemp(unfinished_.data(), O_CLOEXEC);
+    descriptor_ = createDoomed(unfinished_);
     if (descriptor_ >= 0) {
-      removeOnSignals(unfinished_);
       const mode_t mask = umask(0);
       umask(mask);
       fchmod(descriptor_, exists ? existing.st_mode & 07777 : 0666 & ~mask);
