@@ -309,15 +309,8 @@ class Archive : public Source {
     const char* const own = archive_entry_pathname(entry);
     const char* const text = own != nullptr ? own : archive_entry_pathname_utf8(entry);
     std::string_view name = text == nullptr ? "?" : text;
-    for (;;) {
-      if (name.starts_with("/")) {
-        name.remove_prefix(1);
-      } else if (name.starts_with("./")) {
-        name.remove_prefix(2);
-      } else {
-        return std::string(name);
-      }
-    }
+    while (name.starts_with("/") || name.starts_with("./")) name.remove_prefix(1);
+    return std::string(name);
   }
 
   void readMember(archive_entry* entry, Input& input) {
