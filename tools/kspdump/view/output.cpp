@@ -37,8 +37,8 @@ int createDoomed(std::string& file) {
   for (const int number : kEnding) sigaddset(&ending, number);
   sigprocmask(SIG_BLOCK, &ending, &before);
   const int descriptor = mkostemp(file.data(), O_CLOEXEC);
-  if (descriptor >= 0 && file.size() < sizeof doomed) {
-    file.copy(doomed, file.size());
+  if (descriptor >= 0) {
+    file.copy(doomed, sizeof doomed - 1);
     for (const int number : kEnding) {
       if (signal(number, removeAndEnd) == SIG_IGN) signal(number, SIG_IGN);
     }

@@ -75,9 +75,9 @@ std::string drawLine(const std::vector<double>& values) {
   double least = std::numeric_limits<double>::infinity();
   double greatest = -least;
   for (const double value : values) {
-    if (std::isnan(value)) continue;
-    least = std::min(least, value);
-    greatest = std::max(greatest, value);
+    // These pass over values that are missing.
+    least = std::fmin(least, value);
+    greatest = std::fmax(greatest, value);
   }
   std::string path;
   bool isDrawing = false;
