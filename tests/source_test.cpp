@@ -181,9 +181,12 @@ TEST_F(SourceTest, EveryArchiveGivesItsMembers) {
   std::string slight = compressed("no capture", "bzip2");
   EXPECT_EQ(std::exchange(slight[3], '1'), '9');
   expect(slight, "%=no capture\n");
-  // Old programs fill their sums with blanks instead of zeros.
+  // Links in these show in the directory at their end alone.
+  expect(packed({{"z", packed({{"a", "ksp1"}, {"b", "->ksp2"}}, "zip")}}), "%/z/a=ksp1\n%/z/b passed over\n");
+  // Old programs fill their sums with blanks instead of zeros, and end them otherwise.
   std::string old = packed({{"a", "ksp1"}});
   EXPECT_EQ(std::exchange(old[148], ' '), '0');
+  EXPECT_EQ(std::exchange(old[155], '\0'), ' ');
   expect(old, "%/a=ksp1\n");
   for (const char* const filter : {"gzip", "xz", "zstd", "bzip2"}) {
     for (const std::string& content : {large, std::string("no capture"), std::string(5000, '\0')}) {

@@ -126,7 +126,7 @@ class Chart : public View {
     for (size_t i = 0; i < options_.width; ++i) {
       std::optional<double> greatest;
       for (size_t at = i * line.size() / options_.width; at < (i + 1) * line.size() / options_.width; ++at) {
-        if (line[at]) greatest = std::max(greatest.value_or(0), *line[at]);
+        if (line[at]) greatest = std::max(greatest.value_or(*line[at]), *line[at]);
       }
       thin.push_back(greatest);
     }
