@@ -3,12 +3,6 @@
 
 namespace kspdump {
 
-namespace {
-
-constexpr size_t kMostFindings = 100;
-
-}  // namespace
-
 std::string_view kindName(Kind kind) {
   constexpr std::string_view kNames[] = {"stats", "summary", "media", "snapshot"};
   return kNames[static_cast<size_t>(kind)];

@@ -120,6 +120,9 @@ struct Finding {
 /// What was read, and what is to be said of it. The records are not kept: they are handed on as they are
 /// decoded.
 struct Capture {
+  /// Findings that are kept; of the others there is a count.
+  static constexpr size_t kMostFindings = 100;
+
   std::string source;
   Kind kind = Kind::kStats;
   /// Valid while the capture is shown.

@@ -97,6 +97,7 @@ class Metrics : public View {
     last_.sort();
     place_ = 0;
     repeated_.clear();
+    furtherRepeated_ = 0;
     isSnapshot_ = capture.kind == Kind::kSnapshot;
     // The summary's fields are statistics of that name.
     const Kind family = capture.kind == Kind::kSummary ? Kind::kStats : capture.kind;
@@ -111,7 +112,9 @@ class Metrics : public View {
       if (last_.isLast(record.key, place_++)) {
         add(record);
         sink_.offer();
-      } else if (repeated_.size() < kMostRepeated) {
+      } else if (repeated_.size() == Capture::kMostFindings) {
+        ++furtherRepeated_;
+      } else {
         repeated_.push_back({record.offset, std::string(record.name) + "(" + std::to_string(record.key) +
                                                 ") comes again; its last record stands"});
       }
@@ -121,6 +124,7 @@ class Metrics : public View {
   void end(Capture& capture) override {
     if (isSnapshot_) addNewest(capture);
     for (Finding& finding : repeated_) capture.find(finding.offset, std::move(finding.reason));
+    capture.furtherFindings += furtherRepeated_;
     last_.clear();
     place_ = 0;
   }
@@ -128,8 +132,6 @@ class Metrics : public View {
   [[nodiscard]] bool showsFindings() const override { return false; }
 
  private:
-  static constexpr size_t kMostRepeated = 1000;
-
   /// Of a snapshot the newest interval in use is shown.
   void addNewest(const Capture& capture) {
     intervals_.end(capture);
@@ -170,6 +172,7 @@ class Metrics : public View {
   LastOfKeys last_;
   uint32_t place_ = 0;
   std::vector<Finding> repeated_;
+  uint64_t furtherRepeated_ = 0;
   Series intervals_;
 };
 
