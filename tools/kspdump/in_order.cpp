@@ -183,17 +183,10 @@ class InOrder {
     noteFirst();
     lock.unlock();
 
-    std::exception_ptr thrown;
-    bool isOver = false;
-    try {
-      isOver = fill(*from->source, inputs, count);
-    } catch (...) {
-      thrown = std::current_exception();
-    }
+    const bool isOver = fill(*from->source, inputs, count);
     lock.lock();
     from->isBusy = false;
     from->isDone = isOver;
-    if (thrown != nullptr) std::rethrow_exception(thrown);
     if (!isOver) startAnother();
     changed_.notify_all();
     return true;
@@ -237,7 +230,7 @@ class InOrder {
       threads_.emplace_back([this] { runBeside(); });
       ++running_;
     } catch (const std::exception&) {
-      most_ = 0;  // those that there are do it
+      most_ = running_;  // those that there are do it
     }
   }
 

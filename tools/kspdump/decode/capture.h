@@ -100,10 +100,10 @@ struct Share {
   uint64_t recognised = 0;
   uint64_t of = 0;
 
-  /// Rounded down.
+  /// Rounded down; `of` is not 0.
   [[nodiscard]] unsigned percent() const {
     constexpr uint64_t kWhole = 100;
-    return of == 0 ? 0 : static_cast<unsigned>(recognised * kWhole / of);
+    return static_cast<unsigned>(recognised * kWhole / of);
   }
   [[nodiscard]] bool isEnough() const { return of != 0 && recognised >= of - recognised; }
 };

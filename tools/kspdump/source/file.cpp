@@ -119,15 +119,10 @@ TooLarge::TooLarge(uint64_t greatest) : ReadFault(largerThan(greatest)) {}
 void readAll(const std::function<size_t(unsigned char* out, size_t size)>& read, uint64_t told,
              uint64_t greatest, Buffer& bytes) {
   // What a header says of a size is no reason to take as much memory.
-  constexpr uint64_t kMostRead = uint64_t{1} << 20;
-  constexpr uint64_t kLeastRead = uint64_t{1} << 12;
+  constexpr size_t kAtOnce = size_t{1} << 16;
   for (;;) {
     if (std::max<uint64_t>(told, bytes.size()) > greatest) throw TooLarge(greatest);
-    // One byte more, of what is told and of the most, shows that they end there.
-    const uint64_t left = told > bytes.size() ? told - bytes.size() : 0;
-    const uint64_t wanted = std::clamp(std::max<uint64_t>(left + 1, bytes.size() / 4), kLeastRead, kMostRead);
-    const auto count = static_cast<size_t>(std::min(wanted, greatest + 1 - bytes.size()));
-    const size_t got = read(bytes.room(count), count);
+    const size_t got = read(bytes.room(kAtOnce), kAtOnce);
     if (got == 0) return;
     bytes.added(got);
   }

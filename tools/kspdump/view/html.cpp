@@ -452,8 +452,8 @@ class Html : public View {
     unsigned present = 0;
     for (const auto& total : totals_) {
       if (!total) continue;
-      if (!least || *total < *least) least = total;
-      if (!greatest || *total > *greatest) greatest = total;
+      least = std::min(least.value_or(*total), *total);
+      greatest = std::max(greatest.value_or(*total), *total);
       all += *total;
       ++present;
     }

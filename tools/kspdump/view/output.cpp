@@ -38,7 +38,7 @@ int createDoomed(std::string& file) {
   sigprocmask(SIG_BLOCK, &ending, &before);
   const int descriptor = mkostemp(file.data(), O_CLOEXEC);
   if (descriptor >= 0) {
-    file.copy(doomed, sizeof doomed - 1);
+    file.copy(doomed, sizeof doomed);  // no path that opens is longer, with its end
     for (const int number : kEnding) {
       if (signal(number, removeAndEnd) == SIG_IGN) signal(number, SIG_IGN);
     }
@@ -95,9 +95,7 @@ void Output::write(std::string_view text) {
     if (written >= 0) {
       text.remove_prefix(static_cast<size_t>(written));
     } else if (errno == EPIPE) {
-      signal(SIGPIPE, SIG_DFL);
-      raise(SIGPIPE);
-      _exit(128 + SIGPIPE);  // where the signal is blocked
+      _exit(128 + SIGPIPE);  // as a shell tells of the signal, which is ignored or blocked
     } else if (errno == EAGAIN) {
       pollfd writable = {.fd = descriptor_, .events = POLLOUT, .revents = 0};
       poll(&writable, 1, -1);

@@ -2,7 +2,6 @@
 #pragma once
 
 #include <algorithm>
-#include <charconv>
 #include <concepts>
 #include <cstddef>
 #include <cstring>
@@ -88,8 +87,7 @@ class Appender {
 /// Appends a number in decimal.
 template <std::integral Number>
 void appendNumber(std::string& out, Number number) {
-  char digits[24];
-  out.append(digits, std::to_chars(digits, digits + sizeof digits, number).ptr);
+  out += std::to_string(number);
 }
 
 /// Whether a text is printable ASCII.
