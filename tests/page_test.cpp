@@ -35,13 +35,17 @@ std::string pathsOf(const std::string& svg) {
 TEST(Picture, BarsStandOnNothing) {
   std::vector<double> many(1000, 0);
   many[500] = 7;
+  std::vector<double> opposite(1000, 0);
+  opposite[500] = -7;
+  opposite[501] = 7;
   const std::pair<std::vector<double>, const char*> cases[] = {
       {{1, 2}, "up M0 24L0 12L63 12L63 24M64 24L64 0L127 0L127 24\n"},
       {{3, -1}, "up M0 18L0 0L63 0L63 18\ndown M64 18L64 24L127 24L127 18\n"},
       {{0, kMissing}, ""},
       // The least bar is seen, and so is one value of many.
       {{1, 1000}, "up M0 24L0 23L63 23L63 24M64 24L64 0L127 0L127 24\n"},
-      {many, "up M64 24L64 0L65 0L65 24\n"}};
+      {many, "up M64 24L64 0L65 0L65 24\n"},
+      {opposite, "down M64 12L64 24L65 24L65 12\n"}};
   for (const auto& each : cases) {
     const auto valueAt = [&](size_t at) { return each.first[at]; };
     EXPECT_EQ(pathsOf(drawBars(each.first.size(), valueAt)), each.second);
@@ -51,9 +55,9 @@ TEST(Picture, BarsStandOnNothing) {
 TEST(Picture, LinesLoseNoSpike) {
   EXPECT_EQ(pathsOf(drawLine({0, 1, kMissing, 1})), "line M0 23L43 1M128 1\n");
   EXPECT_EQ(pathsOf(drawLine({5, 5})), "line M0 12L128 12\n");
-  std::vector<double> each(100, 1);
+  std::vector<double> each(128, 1);
   each[50] = 2;
-  EXPECT_NE(pathsOf(drawLine(each)).find("L63 23L65 1L66 23"), std::string::npos) << "not a point a value";
+  EXPECT_NE(pathsOf(drawLine(each)).find("L49 23L50 1L51 23"), std::string::npos) << "not a point a value";
   std::vector<double> many(10000, 1);
   many[5010] = 9;
   many[7000] = -7;

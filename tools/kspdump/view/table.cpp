@@ -41,7 +41,8 @@ class Table : public View {
   void measure(std::span<const Record> records) override {
     for (const Record& record : records) {
       greatestKey_ = std::max(greatestKey_, record.key);
-      nameWidth_ = std::max(nameWidth_, record.isListed ? record.name.size() : columnsOf(shown(record.name)));
+      nameWidth_ =
+          std::max(nameWidth_, record.isListed ? record.name.size() : columnsOf(printable(record.name)));
       if (const auto total = narrowSum(record.values)) {
         greatestNarrow_ = std::max(greatestNarrow_, *total);
       } else {
@@ -98,7 +99,7 @@ class Table : public View {
         putNumber(row + valueEnd_, *narrow);
       } else {
         addCell(std::to_string(record.key), keyWidth_, true);
-        addCell(cutTo(shown(record.name), nameWidth_), nameWidth_, false);
+        addCell(cutTo(printable(record.name), nameWidth_), nameWidth_, false);
         appendPadded(out, sum(record.values).text(), valueWidth_, true);
         if (record.isArray) out.append(kGap, ' ');
       }
@@ -131,11 +132,6 @@ class Table : public View {
   static constexpr std::string_view kNameHead = "NAME";
   static constexpr std::string_view kValueHead = "VALUE/SUM";
   static constexpr size_t kLeastKey = 5;
-
-  /// A name without anything that could steer a terminal; those of tables are plain.
-  static std::string shown(std::string_view name) {
-    return isPlain(name) ? std::string(name) : printable(name);
-  }
 
   void addCell(std::string_view text, size_t width, bool right) {
     appendPadded(sink_.text, text, width, right);
@@ -203,7 +199,7 @@ void Table::difference(const Series& series) {
          ": " + std::to_string(tracks.size()) + (series.showsUnchanged() ? " shown\n" : " changed\n");
   Grid grid({{"KEY", true}, {"NAME", false}, {"OLD", true}, {"NEW", true}, {"DELTA", true}, {"%", true}});
   for (const size_t track : tracks) {
-    grid.add({std::to_string(series.tracks()[track].key), shown(series.tracks()[track].name),
+    grid.add({std::to_string(series.tracks()[track].key), printable(series.tracks()[track].name),
               decimal(series.sum(track, 0)), decimal(series.sum(track, 1)),
               decimal(series.change(track), true), percent(series.percent(track))});
   }
@@ -247,7 +243,7 @@ void Table::trend(const Series& series) {
     }
     const auto change = series.change(track);
     std::vector<std::string> row = {std::to_string(series.tracks()[track].key),
-                                    shown(series.tracks()[track].name),
+                                    printable(series.tracks()[track].name),
                                     decimal(series.sum(track, 0)),
                                     decimal(series.sum(track, series.points() - 1)),
                                     decimal(least),
@@ -308,7 +304,7 @@ void Table::listing(const Listing& listing) {
     for (size_t i = 0; i < row.size(); ++i) {
       const auto* number = std::get_if<uint64_t>(&row[i]);
       cells.push_back(number != nullptr ? std::to_string(*number) + listing.columns[i].unit
-                                        : shown(std::get<std::string>(row[i])));
+                                        : printable(std::get<std::string>(row[i])));
     }
     grid.add(std::move(cells));
   }

@@ -46,6 +46,11 @@ std::string_view takeCharacter(std::string_view& text, uint32_t& character) {
   return taken;
 }
 
+/// Whether a text is ASCII without controls.
+bool isPlain(std::string_view text) {
+  return std::all_of(text.begin(), text.end(), [](unsigned char c) { return c >= ' ' && c < 0x80; });
+}
+
 template <class MayStand>
 std::string spelledOutUnless(std::string_view text, MayStand mayStand) {
   std::string out;
@@ -62,10 +67,6 @@ std::string spelledOutUnless(std::string_view text, MayStand mayStand) {
 }
 
 }  // namespace
-
-bool isPlain(std::string_view text) {
-  return std::all_of(text.begin(), text.end(), [](char c) { return c >= ' ' && c < 0x7F; });
-}
 
 std::string fixed(double number, int decimals) {
   char text[512];  // any double fits

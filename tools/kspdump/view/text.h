@@ -90,9 +90,6 @@ void appendNumber(std::string& out, Number number) {
   out += std::to_string(number);
 }
 
-/// Whether a text is printable ASCII.
-bool isPlain(std::string_view text);
-
 /// A number with `decimals` digits behind its point.
 std::string fixed(double number, int decimals);
 

@@ -41,7 +41,7 @@ std::string drawBars(size_t count, const std::function<double(size_t)>& valueAt)
     greatest = std::max(greatest, value);
     least = std::min(least, value);
   }
-  const double range = greatest > least ? greatest - least : 1;
+  const double range = greatest - least;
   const double base = kHeight * greatest / range;
   const size_t bars = std::min(count, kMostBars);
   const double step = static_cast<double>(kWidth) / static_cast<double>(bars);
@@ -54,7 +54,7 @@ std::string drawBars(size_t count, const std::function<double(size_t)>& valueAt)
       const double each = valueAt(at);
       if (std::abs(each) > std::abs(value)) value = each;
     }
-    if (value == 0 || std::isnan(value)) continue;
+    if (value == 0) continue;
     std::string& path = value > 0 ? up : down;
     // What is there at all is seen.
     const double height = std::max(std::abs(value) * kHeight / range, 1.0);
