@@ -55,6 +55,7 @@ TEST(Picture, BarsStandOnNothing) {
 TEST(Picture, LinesLoseNoSpike) {
   EXPECT_EQ(pathsOf(drawLine({0, 1, kMissing, 1})), "line M0 23L43 1M128 1\n");
   EXPECT_EQ(pathsOf(drawLine({5, 5})), "line M0 12L128 12\n");
+  EXPECT_EQ(pathsOf(drawLine({5})), "line M0 12\n");
   std::vector<double> each(128, 1);
   each[50] = 2;
   EXPECT_NE(pathsOf(drawLine(each)).find("L49 23L50 1L51 23"), std::string::npos) << "not a point a value";

@@ -80,8 +80,7 @@ std::unique_ptr<Source> openInput(Input& input, const Reading& reading) {
   }
   if (file->isFolder() && input.path != "-") return folderSource(input);
   const uint64_t size = file->size();
-  readHead(*file, input.bytes,
-           size == 0 ? kTellingBytes : static_cast<size_t>(std::min<uint64_t>(size + 1, kHeadBytes)));
+  readHead(*file, input.bytes, size == 0 ? kTellingBytes : kHeadBytes);
   const Packing packing = packingOfOther(input.bytes, reading);
   if (packing != Packing::kNone) {
     // From the start again where that is possible: then the archive can be gone about in.
@@ -111,9 +110,8 @@ class NameList : public Source {
     if (isOver_) return false;
     try {
       if (file_ == nullptr) {
-        isOver_ = true;
+        isOver_ = true;  // unless it can be opened and read
         file_ = openFile(list_, false);
-        isOver_ = false;
       }
       std::string name;
       if (!take(name)) return false;

@@ -57,7 +57,7 @@ class Report : public View {
   }
 
   void addPages(Capture& capture) {
-    constexpr size_t kGreatestPage = size_t{1} << 26;
+    constexpr size_t kGreatestPage = size_t{1} << 22;
     std::vector<char> page(size_t{1} << 18);
     uint32_t cursor = 0;
     for (int done = 0; done == 0;) {
