@@ -80,7 +80,8 @@ std::unique_ptr<Source> openInput(Input& input, const Reading& reading) {
   }
   if (file->isFolder() && input.path != "-") return folderSource(input);
   const uint64_t size = file->size();
-  readHead(*file, input.bytes, size == 0 ? kTellingBytes : static_cast<size_t>(std::min<uint64_t>(size + 1, kHeadBytes)));
+  readHead(*file, input.bytes,
+           size == 0 ? kTellingBytes : static_cast<size_t>(std::min<uint64_t>(size + 1, kHeadBytes)));
   const Packing packing = packingOfOther(input.bytes, reading);
   if (packing != Packing::kNone) {
     // From the start again where that is possible: then the archive can be gone about in.
