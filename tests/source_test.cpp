@@ -14,6 +14,7 @@
 #include <utility>
 
 #include "tools/kspdump/source/source.h"
+#include "tools/kspdump/source/stream.h"
 
 namespace {
 
@@ -256,6 +257,12 @@ TEST_F(SourceTest, NothingLargerThanTheLimitIsRead) {
   write("d/film", std::string(10001, 'k'));
   write("d/more", "ksp" + std::string(10001, 'k'));
   EXPECT_EQ(all({"d"}), "d/film passed over\nd/more" + large + "\n");
+
+  Expansion expansion(10);
+  expansion.took(5, 2);
+  expansion.took(1, 0);
+  expansion.gave(3010);
+  EXPECT_THROW(expansion.gave(1), ReadFault);
 
   // Small members without end.
   reading_.greatest = 9000;

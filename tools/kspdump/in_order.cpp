@@ -20,9 +20,8 @@ namespace kspdump {
 
 namespace {
 
-/// Captures are handed out so many bytes at a time, about, and so many of them at most.
+/// Captures are handed out so many bytes at a time, about.
 constexpr uint64_t kBatchBytes = uint64_t{1} << 17;
-constexpr size_t kMostInBatch = 64;
 
 /// Text that may wait for its turn, in all batches.
 constexpr size_t kMostWaiting = size_t{8} << 20;
@@ -209,8 +208,7 @@ class InOrder {
   /// Takes captures from a source. Returns whether these were its last.
   bool fill(Source& source, std::vector<Input>& inputs, size_t& count) const {
     uint64_t bytes = 0;
-    for (count = 0; count < kMostInBatch && bytes < kBatchBytes; ++count) {
-      if (source.isOver()) return true;
+    for (count = 0; bytes < kBatchBytes; ++count) {
       if (count == inputs.size()) inputs.emplace_back();
       Input& input = inputs[count];
       try {
@@ -218,19 +216,20 @@ class InOrder {
       } catch (const std::bad_alloc&) {
         input.fail("out of memory");
       }
-      bytes += input.state == Input::State::kNamed ? usualBytes_.load() : input.bytes.size();
+      // The least of them takes some work, too.
+      bytes += sizeof input + (input.state == Input::State::kNamed ? usualBytes_.load() : input.bytes.size());
     }
     return source.isOver();
   }
 
   /// A thread more, where there is room for it; called with the lock held.
   void startAnother() {
-    if (running_ >= most_) return;
+    if (spare_ == 0) return;
     try {
       threads_.emplace_back([this] { runBeside(); });
-      ++running_;
+      --spare_;
     } catch (const std::exception&) {
-      most_ = running_;  // those that there are do it
+      spare_ = 0;  // those that there are do it
     }
   }
 
@@ -329,8 +328,8 @@ class InOrder {
 
   const Work& work_;
   const size_t mostBatches_ = kBatchesAJob * work_.jobs;
-  size_t most_ = work_.jobs;
-  size_t running_ = 1;
+  /// Threads that may still be started.
+  size_t spare_ = work_.jobs - 1;
   std::mutex mutex_;
   std::condition_variable changed_;
   std::list<Node> nodes_;

@@ -317,10 +317,8 @@ class CommandLine {
 
   void takeOptions() {
     constexpr int kFirst = 256;
-    constexpr int kHelp = kFirst - 1;
-    constexpr int kShowVersion = kFirst - 2;
-    std::vector<option> options = {{"help", no_argument, nullptr, kHelp},
-                                   {"version", no_argument, nullptr, kShowVersion}};
+    std::vector<option> options = {{"help", no_argument, nullptr, 'h'},
+                                   {"version", no_argument, nullptr, 'v'}};
     for (const OptionRow& row : kOptions) {
       const auto number = static_cast<int>(&row - kOptions);
       options.push_back(
@@ -334,8 +332,8 @@ class CommandLine {
     words.push_back(nullptr);
     opterr = 0;
     for (int got = 0; (got = getopt_long(count, words.data(), ":h", options.data(), nullptr)) != -1;) {
-      if (got == kHelp || got == 'h') throw Told{help(wanted_.command)};
-      if (got == kShowVersion) throw Told{kVersion};
+      if (got == 'h') throw Told{help(wanted_.command)};
+      if (got == 'v') throw Told{kVersion};
       if (got == ':') throw UsageError(withoutValue(kOptions[optopt - kFirst], "no"));
       if (got == '?') refuse(words[static_cast<size_t>(optind) - 1]);
       takeOption(kOptions[got - kFirst], optarg != nullptr ? optarg : "");
@@ -455,7 +453,7 @@ class CommandLine {
 /// A closed standard stream stays unusable, instead of becoming the next file that is opened.
 void keepStandardDescriptors() {
   for (int number = STDIN_FILENO; number <= STDERR_FILENO; ++number) {
-    if (fcntl(number, F_GETFD) < 0) open("/dev/null", number == STDIN_FILENO ? O_WRONLY : O_RDONLY);
+    if (fcntl(number, F_GETFD) == -1) open("/dev/null", number == STDIN_FILENO ? O_WRONLY : O_RDONLY);
   }
 }
 

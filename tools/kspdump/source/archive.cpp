@@ -20,7 +20,8 @@ namespace {
 bool isTarHeader(std::span<const unsigned char> header) {
   constexpr size_t kSumAt = 148;
   constexpr size_t kSumBytes = 8;
-  if (header.size() < kTellingBytes) return false;
+  constexpr size_t kHeaderBytes = 512;
+  if (header.size() < kHeaderBytes) return false;
   uint32_t told = 0;
   size_t digits = 0;
   for (size_t i = kSumAt; i < kSumAt + kSumBytes; ++i) {
@@ -32,7 +33,7 @@ bool isTarHeader(std::span<const unsigned char> header) {
   }
   if (digits == 0) return false;
   uint32_t sum = kSumBytes * ' ';
-  for (size_t i = 0; i < kTellingBytes; ++i) {
+  for (size_t i = 0; i < kHeaderBytes; ++i) {
     if (i < kSumAt || i >= kSumAt + kSumBytes) sum += header[i];
   }
   return told == sum;
@@ -43,14 +44,14 @@ bool isTarHeader(std::span<const unsigned char> header) {
 Packing packingOf(std::span<const unsigned char> head) {
   using std::string_view_literals::operator""sv;
   const std::string_view text(reinterpret_cast<const char*>(head.data()), head.size());
-  const auto isDigit = [](char c) { return c >= '1' && c <= '9'; };
   if (text.starts_with("\x1F\x8B\x08"sv)) return Packing::kGzip;
   if (text.starts_with("\xFD"
                        "7zXZ\0"sv))
     return Packing::kXz;
   if (text.starts_with("\x28\xB5\x2F\xFD"sv)) return Packing::kZstd;
-  if (text.starts_with("BZh"sv) && text.size() >= 10 && isDigit(text[3]) &&
-      (text.substr(4, 6) == "1AY&SY"sv || text.substr(4, 6) == "\x17\x72\x45\x38\x50\x90"sv)) {
+  // Behind a digit, a block or the end.
+  if (text.starts_with("BZh"sv) &&
+      (text.find("1AY&SY"sv) == 4 || text.find("\x17\x72\x45\x38\x50\x90"sv) == 4)) {
     return Packing::kBzip2;
   }
   if (text.starts_with("PK\3\4"sv) || text.starts_with("PK\5\6"sv)) return Packing::kZip;
@@ -59,13 +60,11 @@ Packing packingOf(std::span<const unsigned char> head) {
 
 namespace {
 
-constexpr size_t kBlock = size_t{1} << 16;
-
 /// The library's reader over a stream, for one way of packing alone.
 class Reader {
  public:
   Reader(std::unique_ptr<Stream> stream, Packing packing, uint64_t greatest)
-      : stream_(std::move(stream)), expansion_(greatest), block_(kBlock), archive_(archive_read_new()) {
+      : stream_(std::move(stream)), expansion_(greatest), block_(kBlockBytes), archive_(archive_read_new()) {
     if (archive_ == nullptr) throw std::bad_alloc();
     check(enable(packing));
     check(archive_read_set_callback_data(archive(), this));
@@ -82,16 +81,13 @@ class Reader {
 
   /// Reads what the current member has. Throws ReadFault.
   size_t read(unsigned char* out, size_t size) {
-    for (int tries = 0;; ++tries) {
-      const la_ssize_t got = archive_read_data(archive(), out, size);
-      if (got == ARCHIVE_RETRY && tries < kMostTries) continue;
-      if (got < 0) {
-        isLost_ = got == ARCHIVE_FATAL;
-        throw ReadFault(error());
-      }
-      expansion_.gave(static_cast<uint64_t>(got));
-      return static_cast<size_t>(got);
+    const la_ssize_t got = archive_read_data(archive(), out, size);
+    if (got < 0) {
+      isLost_ = got == ARCHIVE_FATAL;
+      throw ReadFault(error());
     }
+    expansion_.gave(static_cast<uint64_t>(got));
+    return static_cast<size_t>(got);
   }
 
   /// Reads the next bytes of the current member, where holes do not matter; none at its end. They are valid
@@ -146,11 +142,9 @@ class Reader {
         return archive_read_support_format_tar(archive());
       case Packing::kZip:
         return archive_read_support_format_zip(archive());
-      case Packing::kGzip:
-      case Packing::kNone:
-        break;
+      default:
+        return ARCHIVE_FATAL;
     }
-    return ARCHIVE_FATAL;
   }
 
   std::string error() const {
@@ -205,10 +199,7 @@ class Unpacked : public Stream {
   Unpacked(std::unique_ptr<Stream> stream, Packing packing, uint64_t greatest)
       : reader_(std::move(stream), packing, greatest), isEmpty_(reader_.next() == nullptr) {}
   size_t read(unsigned char* out, size_t size) override {
-    if (block_.empty() && !isEmpty_) {
-      block_ = reader_.readBlock();
-      isEmpty_ = block_.empty();
-    }
+    if (block_.empty() && !isEmpty_) block_ = reader_.readBlock();
     const size_t count = std::min(size, block_.size());
     if (count != 0) std::memcpy(out, block_.data(), count);
     block_ = block_.subspan(count);
@@ -218,21 +209,20 @@ class Unpacked : public Stream {
  private:
   Reader reader_;
   std::span<const unsigned char> block_;
-  bool isEmpty_;
+  const bool isEmpty_;
 };
 
 /// The archive library passes over the checksums of gzip, zlib does not.
 class Gunzipped : public Stream {
  public:
   Gunzipped(std::unique_ptr<Stream> stream, uint64_t greatest)
-      : stream_(std::move(stream)), expansion_(greatest), block_(kBlock) {
+      : stream_(std::move(stream)), expansion_(greatest), block_(kBlockBytes) {
     constexpr int kGzipAlone = 16 + MAX_WBITS;
     if (inflateInit2(&state_, kGzipAlone) != Z_OK) throw std::bad_alloc();
   }
   ~Gunzipped() override { inflateEnd(&state_); }
 
   size_t read(unsigned char* out, size_t size) override {
-    if (size == 0) return 0;
     state_.next_out = out;
     const auto room = static_cast<uInt>(std::min<size_t>(size, UINT_MAX));
     state_.avail_out = room;

@@ -1,6 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
 #include <fcntl.h>
-#include <poll.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -10,43 +9,46 @@
 #include <system_error>
 
 #include "tools/kspdump/source/stream.h"
+#include "tools/kspdump/wait.h"
 
 namespace kspdump {
 
-File::File(int descriptor) : descriptor_(descriptor) {
+namespace {
+
+mode_t modeOf(int descriptor) {
   struct stat status = {};
-  if (fstat(descriptor_, &status) != 0) return;
-  isFolder_ = S_ISDIR(status.st_mode);
-  isRegular_ = S_ISREG(status.st_mode);
-  if (isRegular_) {
-    // What others have read of standard input is gone; its offsets are not ours.
-    if (descriptor_ != STDIN_FILENO || lseek(descriptor_, 0, SEEK_CUR) == 0) {
-      size_ = static_cast<uint64_t>(status.st_size);
-    }
-  } else if (S_ISBLK(status.st_mode)) {
-    const off_t end = lseek(descriptor_, 0, SEEK_END);
-    if (end > 0 && lseek(descriptor_, 0, SEEK_SET) == 0) size_ = static_cast<uint64_t>(end);
-  }
+  fstat(descriptor, &status);
+  return status.st_mode;
 }
+
+/// Bytes in a file or on a disk; 0 where nobody knows.
+uint64_t sizeOf(int descriptor) {
+  // What others have read of standard input is gone; its offsets are not ours.
+  if (lseek(descriptor, 0, SEEK_CUR) != 0) return 0;
+  const off_t end = lseek(descriptor, 0, SEEK_END);
+  lseek(descriptor, 0, SEEK_SET);
+  return static_cast<uint64_t>(std::max<off_t>(end, 0));
+}
+
+}  // namespace
+
+File::File(int descriptor) : descriptor_(descriptor), mode_(modeOf(descriptor)), size_(sizeOf(descriptor)) {}
 
 File::~File() {
   if (descriptor_ != STDIN_FILENO) close(descriptor_);
 }
 
 size_t File::read(unsigned char* out, size_t size) {
-  // The end of a file that has its whole size needs no further call.
-  if (isAtEnd_) return 0;
+  // A file that grows meanwhile is read as it was, and its end needs no further call.
+  if (size_ != 0 && at_ == size_) return 0;
   for (;;) {
     const ssize_t got = ::read(descriptor_, out, size);
-    if (got >= 0) {
-      const auto count = static_cast<size_t>(got);
-      at_ += count;
-      isAtEnd_ = isRegular_ && count < size && at_ == size_;
-      return count;
+    if (got != -1) {
+      at_ += static_cast<size_t>(got);
+      return static_cast<size_t>(got);
     }
     if (errno == EAGAIN) {
-      pollfd readable = {.fd = descriptor_, .events = POLLIN, .revents = 0};
-      poll(&readable, 1, -1);
+      waitFor(descriptor_, POLLIN);
     } else if (errno != EINTR) {
       throw ReadFault(std::generic_category().message(errno));
     }
@@ -54,9 +56,9 @@ size_t File::read(unsigned char* out, size_t size) {
 }
 
 bool File::seek(uint64_t offset) {
-  if (size_ == 0 || lseek(descriptor_, static_cast<off_t>(offset), SEEK_SET) < 0) return false;
+  if (size_ == 0) return false;
+  lseek(descriptor_, static_cast<off_t>(offset), SEEK_SET);
   at_ = offset;
-  isAtEnd_ = false;
   return true;
 }
 
@@ -64,7 +66,7 @@ std::unique_ptr<File> openFile(const std::string& path, bool found) {
   if (path == "-") return std::make_unique<File>(STDIN_FILENO);
   // What was a file when its folder was read may be a pipe by now, or a link.
   const int descriptor = open(path.c_str(), O_RDONLY | O_CLOEXEC | (found ? O_NOFOLLOW | O_NONBLOCK : 0));
-  if (descriptor < 0) throw ReadFault(std::generic_category().message(errno));
+  if (descriptor == -1) throw ReadFault(std::generic_category().message(errno));
   return std::make_unique<File>(descriptor);
 }
 
@@ -119,10 +121,9 @@ TooLarge::TooLarge(uint64_t greatest) : ReadFault(largerThan(greatest)) {}
 void readAll(const std::function<size_t(unsigned char* out, size_t size)>& read, uint64_t told,
              uint64_t greatest, Buffer& bytes) {
   // What a header says of a size is no reason to take as much memory.
-  constexpr size_t kAtOnce = size_t{1} << 16;
   for (;;) {
     if (std::max<uint64_t>(told, bytes.size()) > greatest) throw TooLarge(greatest);
-    const size_t got = read(bytes.room(kAtOnce), kAtOnce);
+    const size_t got = read(bytes.room(kBlockBytes), kBlockBytes);
     if (got == 0) return;
     bytes.added(got);
   }

@@ -93,7 +93,7 @@ class Folder : public Source {
     const bool isRoot = levels_.empty();
     const int descriptor =
         open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC | (isRoot ? 0 : O_NOFOLLOW | O_NONBLOCK));
-    if (descriptor < 0) return errno;
+    if (descriptor == -1) return errno;
     const std::unique_ptr<DIR, int (*)(DIR*)> folder(fdopendir(descriptor), closedir);
     struct stat status = {};
     if (folder == nullptr || fstat(descriptor, &status) != 0) return errno;

@@ -10,15 +10,15 @@ namespace kspdump {
 
 namespace {
 
-constexpr size_t kHeadBytes = size_t{1} << 18;
-
 /// Archives within each other that are opened, and compressions around each other that are undone.
 constexpr unsigned kMostNested = 2;
 
-/// Reads the first bytes of a stream, so many of them if there are.
-void readHead(Stream& stream, Buffer& bytes, size_t size) {
-  while (bytes.size() < size) {
-    const size_t count = size - bytes.size();
+/// Reads the first bytes of a stream: a block of them if there are.
+void readHead(Stream& stream, Buffer& bytes) {
+  const uint64_t size = stream.size();
+  const size_t head = size == 0 ? kBlockBytes : static_cast<size_t>(std::min<uint64_t>(size, kBlockBytes));
+  while (bytes.size() < head) {
+    const size_t count = head - bytes.size();
     const size_t got = stream.read(bytes.room(count), count);
     if (got == 0) return;
     bytes.added(got);
@@ -59,7 +59,7 @@ std::unique_ptr<Source> unpack(Input& input, std::unique_ptr<Stream> stream, Pac
     stream = unpacked(std::move(stream), packing, reading.greatest);
     Buffer head;
     try {
-      readHead(*stream, head, kHeadBytes);
+      readHead(*stream, head);
     } catch (const ReadFault& fault) {
       // What was sound up to there may be an archive's members.
       stream = std::make_unique<Broken>(fault.what());
@@ -80,8 +80,7 @@ std::unique_ptr<Source> openInput(Input& input, const Reading& reading) {
   }
   if (file->isFolder() && input.path != "-") return folderSource(input);
   const uint64_t size = file->size();
-  readHead(*file, input.bytes,
-           size == 0 ? kTellingBytes : static_cast<size_t>(std::min<uint64_t>(size + 1, kHeadBytes)));
+  readHead(*file, input.bytes);
   const Packing packing = packingOfOther(input.bytes, reading);
   if (packing != Packing::kNone) {
     // From the start again where that is possible: then the archive can be gone about in.
@@ -129,8 +128,6 @@ class NameList : public Source {
   }
 
  private:
-  static constexpr size_t kLongestName = size_t{1} << 16;
-
   /// Takes the next name. Returns false behind the last.
   bool take(std::string& name) {
     for (;;) {
@@ -143,10 +140,10 @@ class NameList : public Source {
       at_ += length + (end == nullptr ? 0 : 1);
       if (end != nullptr) return true;
       isOver_ = true;  // unless more can be read
-      if (name.size() > kLongestName) throw ReadFault("it has no names that end with NULs");
+      if (name.size() > kBlockBytes) throw ReadFault("it has no names that end with NULs");
       chunk_.clear();
       at_ = 0;
-      chunk_.added(file_->read(chunk_.room(kLongestName), kLongestName));
+      chunk_.added(file_->read(chunk_.room(kBlockBytes), kBlockBytes));
       if (chunk_.size() != 0) {
         isOver_ = false;
         continue;

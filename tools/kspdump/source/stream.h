@@ -2,6 +2,8 @@
 // Bytes on their way from a file or through a decompressor.
 #pragma once
 
+#include <sys/stat.h>
+
 #include <algorithm>
 #include <cstddef>
 #include <cstdint>
@@ -15,6 +17,9 @@
 #include "tools/kspdump/source/source.h"
 
 namespace kspdump {
+
+/// Bytes that are read at once.
+inline constexpr size_t kBlockBytes = size_t{1} << 16;
 
 /// Why something cannot be read.
 class ReadFault : public std::runtime_error {
@@ -30,7 +35,7 @@ class Stream {
   Stream& operator=(const Stream&) = delete;
   virtual ~Stream() = default;
 
-  /// Reads up to `size` bytes, none only at the end. Throws ReadFault.
+  /// Reads up to `size` bytes, of which there is one at least; none only at the end. Throws ReadFault.
   virtual size_t read(unsigned char* out, size_t size) = 0;
 
   /// Goes to an offset from the first byte. Returns false where it cannot.
@@ -49,15 +54,13 @@ class File : public Stream {
   size_t read(unsigned char* out, size_t size) override;
   bool seek(uint64_t offset) override;
   [[nodiscard]] uint64_t size() const override { return size_; }
-  [[nodiscard]] bool isFolder() const { return isFolder_; }
-  [[nodiscard]] bool isRegular() const { return isRegular_; }
+  [[nodiscard]] bool isFolder() const { return S_ISDIR(mode_); }
+  [[nodiscard]] bool isRegular() const { return S_ISREG(mode_); }
 
  private:
   int descriptor_;
-  bool isFolder_ = false;
-  bool isRegular_ = false;
-  bool isAtEnd_ = false;
-  uint64_t size_ = 0;
+  mode_t mode_;
+  uint64_t size_;
   uint64_t at_ = 0;
 };
 
@@ -116,9 +119,6 @@ std::unique_ptr<Source> folderSource(const Input& input);
 /// What the first bytes of a stream announce.
 enum class Packing { kNone, kGzip, kXz, kZstd, kBzip2, kTar, kZip };
 Packing packingOf(std::span<const unsigned char> head);
-
-/// So many bytes tell what a stream is.
-inline constexpr size_t kTellingBytes = 512;
 
 /// Unpacks a compressed stream.
 std::unique_ptr<Stream> unpacked(std::unique_ptr<Stream> stream, Packing packing, uint64_t greatest);

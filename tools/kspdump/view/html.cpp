@@ -110,10 +110,9 @@ std::string_view nameOf(About about) {
       return "difference";
     case About::kTrend:
       return "trend";
-    case About::kSnapshot:
-      break;
+    default:
+      return "snapshot";
   }
-  return "snapshot";
 }
 
 Columns columnsOf(About about) {
@@ -148,10 +147,9 @@ Columns columnsOf(About about) {
       return kDifference;
     case About::kTrend:
       return kTrend;
-    case About::kSnapshot:
-      break;
+    default:
+      return kSnapshot;
   }
-  return kSnapshot;
 }
 
 class Html : public View {

@@ -2,7 +2,6 @@
 #include "tools/kspdump/view/output.h"
 
 #include <fcntl.h>
-#include <poll.h>
 #include <signal.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -14,6 +13,7 @@
 #include <system_error>
 
 #include "tools/kspdump/view/text.h"
+#include "tools/kspdump/wait.h"
 
 namespace kspdump {
 
@@ -37,7 +37,7 @@ int createDoomed(std::string& file) {
   for (const int number : kEnding) sigaddset(&ending, number);
   sigprocmask(SIG_BLOCK, &ending, &before);
   const int descriptor = mkostemp(file.data(), O_CLOEXEC);
-  if (descriptor >= 0) {
+  if (descriptor != -1) {
     file.copy(doomed, sizeof doomed);  // no path that opens is longer, with its end
     for (const int number : kEnding) {
       if (signal(number, removeAndEnd) == SIG_IGN) signal(number, SIG_IGN);
@@ -72,13 +72,12 @@ Output::Output(std::string path) : path_(path == "-" ? "" : std::move(path)), de
     const bool exists = stat(target_.c_str(), &existing) == 0;
     unfinished_ = target_.substr(0, target_.rfind('/') + 1) + ".kspdump-XXXXXX";
     descriptor_ = createDoomed(unfinished_);
-    if (descriptor_ >= 0) {
-      const mode_t mask = umask(0);
-      umask(mask);
-      fchmod(descriptor_, exists ? existing.st_mode & 07777 : 0666 & ~mask);
+    if (descriptor_ != -1) {
+      // Nothing else is created, so the mask need not come back.
+      fchmod(descriptor_, exists ? existing.st_mode & 07777 : 0666 & ~umask(0));
     }
   }
-  if (descriptor_ < 0) {
+  if (descriptor_ == -1) {
     unfinished_.clear();
     fail("cannot be opened");
   }
@@ -86,19 +85,18 @@ Output::Output(std::string path) : path_(path == "-" ? "" : std::move(path)), de
 
 Output::~Output() {
   if (!unfinished_.empty()) unlink(unfinished_.c_str());
-  if (!path_.empty() && descriptor_ >= 0) close(descriptor_);
+  if (!path_.empty() && descriptor_ != -1) close(descriptor_);
 }
 
 void Output::write(std::string_view text) {
   while (!text.empty()) {
     const ssize_t written = ::write(descriptor_, text.data(), text.size());
-    if (written >= 0) {
+    if (written != -1) {
       text.remove_prefix(static_cast<size_t>(written));
     } else if (errno == EPIPE) {
       _exit(128 + SIGPIPE);  // as a shell tells of the signal, which is ignored or blocked
     } else if (errno == EAGAIN) {
-      pollfd writable = {.fd = descriptor_, .events = POLLOUT, .revents = 0};
-      poll(&writable, 1, -1);
+      waitFor(descriptor_, POLLOUT);
     } else if (errno != EINTR) {
       fail("cannot be written");
     }

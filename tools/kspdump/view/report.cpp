@@ -2,6 +2,7 @@
 // The controller's own text report of a snapshot.
 
 #include <algorithm>
+#include <memory>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -57,23 +58,20 @@ class Report : public View {
   }
 
   void addPages(Capture& capture) {
-    constexpr size_t kGreatestPage = size_t{1} << 22;
-    std::vector<char> page(size_t{1} << 18);
+    // Room that is not written to takes no memory.
+    constexpr size_t kPage = size_t{1} << 22;
+    const auto page = std::make_unique_for_overwrite<char[]>(kPage);
     uint32_t cursor = 0;
     for (int done = 0; done == 0;) {
-      const uint32_t start = cursor;
-      uint64_t size = page.size();
-      done = KSPParseSnapshotBufferWithInplaceParser(capture.bytes.data(), capture.bytes.size(), page.data(),
+      uint64_t size = kPage;
+      done = KSPParseSnapshotBufferWithInplaceParser(capture.bytes.data(), capture.bytes.size(), page.get(),
                                                      &size, capture.header.data(), &cursor);
       const bool isEmpty = size == 1;
-      addLines({page.data(), static_cast<size_t>(size) - 1});
+      addLines({page.get(), static_cast<size_t>(size) - 1});
       if (done != 0) break;
-      // The line that did not fit opens the next page, or gets a larger one where it had this to itself.
+      // The line that did not fit opens the next page, unless it had this to itself.
       if (!isEmpty) {
         --cursor;
-      } else if (page.size() < kGreatestPage) {
-        page.resize(page.size() * 2);
-        cursor = start;
       } else {
         const uint32_t lost = std::max(cursor, 1U) - 1;
         capture.find(ksp::SnapshotHeader(capture.header.data()).recordOffset(lost),
