@@ -30,14 +30,14 @@ namespace {
 /// Columns of the terminal that the results go to or, where there is none, as the environment says.
 size_t lineWidth() {
   constexpr size_t kUsual = 80;
-  constexpr size_t kMost = 10000;
   winsize size = {};
-  if (ioctl(STDOUT_FILENO, TIOCGWINSZ, &size) == 0 && size.ws_col != 0) return size.ws_col;
+  ioctl(STDOUT_FILENO, TIOCGWINSZ, &size);
+  if (size.ws_col != 0) return size.ws_col;
   const char* const columns = std::getenv("COLUMNS");
   const std::string_view text = columns != nullptr ? columns : "";
-  size_t width = 0;
+  uint16_t width = 0;  // no line is longer than a terminal's can be
   std::from_chars(text.data(), text.data() + text.size(), width);
-  return width == 0 ? kUsual : std::min(width, kMost);
+  return width == 0 ? kUsual : width;
 }
 
 /// How many captures are shown, on one line of a terminal that the results are not written to.
@@ -154,8 +154,9 @@ class Captures {
       try {
         kspdump::show(options_.decoding, capture, job->batch, *job->view);
       } catch (const std::bad_alloc&) {
-        // One capture too large does not stop the others.
+        // One capture too large does not stop the others, and leaves nothing to them.
         capture = {};
+        job->view = options_.form->make(viewOptions_, lane.sink);
         return tellFault(lane, input.name, "out of memory");
       }
       if (!capture.isClean()) tellFindings(lane, capture);

@@ -48,18 +48,16 @@ std::vector<Ratio> ratiosOf(const Series& series) {
 }
 
 std::optional<double> ratioAt(const Series& series, const Ratio& ratio, size_t point) {
-  const auto dividend = series.value(ratio.dividend, point, ratio.element);
-  const auto divisor = series.value(ratio.divisor, point, ratio.element);
-  if (!dividend || !divisor) return std::nullopt;
-  return divided(*dividend, *divisor);
+  return divided(series.values(ratio.dividend, point)[ratio.element],
+                 series.values(ratio.divisor, point)[ratio.element]);
 }
 
 std::optional<double> ratioOverall(const Series& series, const Ratio& ratio) {
   Wide dividends;
   Wide divisors;
   for (size_t point = 0; point < series.points(); ++point) {
-    dividends += series.value(ratio.dividend, point, ratio.element).value_or(0);
-    divisors += series.value(ratio.divisor, point, ratio.element).value_or(0);
+    dividends += series.values(ratio.dividend, point)[ratio.element];
+    divisors += series.values(ratio.divisor, point)[ratio.element];
   }
   return divided(dividends, divisors);
 }

@@ -25,7 +25,7 @@ struct Ratio {
 /// their fields, and the write amplification (media writes by host writes).
 std::vector<Ratio> ratiosOf(const Series& series);
 
-/// A ratio at a point; none where a field is missing or nothing would be divided by.
+/// A ratio at a point; none where nothing would be divided by.
 std::optional<double> ratioAt(const Series& series, const Ratio& ratio, size_t point);
 
 /// The ratio of the fields' sums over all points.

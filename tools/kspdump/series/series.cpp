@@ -43,7 +43,6 @@ void Series::end(const Capture& capture) {
 }
 
 void Series::putInTime(const Capture& capture) {
-  if (intervals_.empty()) return;
   // The timestamp is the first word of the fixed layout, and the key of a header's; shown or not.
   const auto key = capture.header.empty() ? 0 : ksp::SnapshotHeader(capture.header.data()).keyOffset();
   if (!key) return;

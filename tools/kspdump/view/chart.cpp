@@ -146,8 +146,7 @@ class Chart : public View {
         out.append(Grid::kGap, ' ');
         appendSparkline(out, lines[row], options_.width - used);
       }
-      out += '\n';
-      sink_.offer();
+      endLine();
     }
   }
 

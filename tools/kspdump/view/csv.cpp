@@ -74,8 +74,7 @@ class Csv : public View {
         addOptional(series.value(track, 0, i));
         addOptional(series.value(track, 1, i));
         addOptional(series.delta(track, i));
-        out += '\n';
-        sink_.offer();
+        endLine();
       }
     }
   }
@@ -95,8 +94,7 @@ class Csv : public View {
           appendCsv(out, std::get<std::string>(row[i]));
         }
       }
-      out += '\n';
-      sink_.offer();
+      endLine();
     }
   }
 
@@ -151,8 +149,7 @@ class Csv : public View {
           if (i < values.size()) appendNumber(out, values[i]);
         }
       }
-      out += '\n';
-      sink_.offer();
+      endLine();
     }
   }
 

@@ -159,8 +159,8 @@ class Json : public View {
           appendJson(out, std::get<std::string>(row[i]));
         }
       }
-      out += "}\n";
-      sink_.offer();
+      out += '}';
+      endLine();
     }
   }
 

@@ -84,8 +84,8 @@ class Report : public View {
   /// The header's title and formats come from the device, so nothing but lines is let through of them.
   void addLines(std::string_view text) {
     for (size_t end = text.find('\n'); end != std::string_view::npos; end = text.find('\n')) {
-      sink_.text.append(printable(text.substr(0, end))).append("\n");
-      sink_.offer();
+      sink_.text += printable(text.substr(0, end));
+      endLine();
       text.remove_prefix(end + 1);
     }
   }

@@ -2,6 +2,7 @@
 // Tables for people.
 
 #include <algorithm>
+#include <cctype>
 #include <cstddef>
 #include <optional>
 #include <string>
@@ -154,8 +155,7 @@ class Table : public View {
       appendPadded(sink_.text, fixed(share, 1) + " %", kShareWidth, true);
       if (value != 0) sink_.text.append(kGap, ' ');
       appendBar(sink_.text, value, largest, longest);
-      sink_.text += '\n';
-      sink_.offer();
+      endLine();
     }
   }
 
@@ -285,8 +285,7 @@ void Table::addRows(Grid& grid, std::string_view pictures, AddPicture addPicture
     const size_t begun = out.size();
     addPicture(row, std::max(options_.width, used + kLeastBars) - used);
     if (out.size() == begun) out.resize(bare);
-    out += '\n';
-    sink_.offer();
+    endLine();
   }
 }
 
@@ -294,7 +293,7 @@ void Table::listing(const Listing& listing) {
   std::vector<Grid::Column> columns;
   for (size_t i = 0; i < listing.columns.size(); ++i) {
     std::string head = listing.columns[i].name;
-    for (char& c : head) c = static_cast<char>(c >= 'a' && c <= 'z' ? c - 'a' + 'A' : c);
+    for (char& c : head) c = static_cast<char>(std::toupper(c));
     const bool isNumber = !listing.rows.empty() && std::holds_alternative<uint64_t>(listing.rows.front()[i]);
     columns.push_back({head, isNumber});
   }
@@ -312,8 +311,7 @@ void Table::listing(const Listing& listing) {
   sink_.text += '\n';
   for (size_t row = 0; row < grid.rows(); ++row) {
     grid.appendRow(sink_.text, row);
-    sink_.text += '\n';
-    sink_.offer();
+    endLine();
   }
 }
 

@@ -67,6 +67,12 @@ class View {
   [[nodiscard]] virtual bool showsFindings() const = 0;
 
  protected:
+  /// Ends a line, behind which the text may be taken.
+  void endLine() {
+    sink_.text += '\n';
+    sink_.offer();
+  }
+
   Sink& sink_;
 };
 
