@@ -48,19 +48,48 @@ struct Command {
   const char* summary;
   unsigned bit;
   Subject subject;
+  Task task;
+  /// Of its captures, where no argument tells.
+  Kind kind;
 };
 
 constexpr Command kCommands[] = {
-    {"stats", "SOURCE...", "Decode statistics streams", kStats, Subject::kStatistics},
-    {"summary", "SOURCE...", "Decode the summary block of statistics streams", kSummary,
-     Subject::kStatistics},
-    {"media", "SOURCE...", "Decode media statistics streams", kMedia, Subject::kStatistics},
-    {"snapshot", "SOURCE", "Show a snapshot: the fixed layout, or a header's", kSnapshot, Subject::kSnapshot},
-    {"diff", "stats|summary|media OLD NEW", "Show what changed between two captures", kDiff,
-     Subject::kDifference},
-    {"trend", "stats|summary|media SOURCE...", "Show how values went over captures", kTrend, Subject::kTrend},
-    {"identify", "SOURCE...", "Tell which kind of capture each is", kIdentify, Subject::kListing},
-    {"keys", "stats|media [GLOB]", "List the keys that have a name", kKeys, Subject::kListing},
+    {"stats", "SOURCE...", "Decode statistics streams", kStats, Subject::kStatistics, Task::kCaptures,
+     Kind::kStats},
+    {"summary", "SOURCE...", "Decode the summary block of statistics streams", kSummary, Subject::kStatistics,
+     Task::kCaptures, Kind::kSummary},
+    {"media", "SOURCE...", "Decode media statistics streams", kMedia, Subject::kStatistics, Task::kCaptures,
+     Kind::kMedia},
+    {"snapshot", "SOURCE", "Show a snapshot: the fixed layout, or a header's", kSnapshot, Subject::kSnapshot,
+     Task::kCaptures, Kind::kSnapshot},
+    {"diff",
+     "stats|summary|media OLD NEW",
+     "Show what changed between two captures",
+     kDiff,
+     Subject::kDifference,
+     Task::kDifference,
+     {}},
+    {"trend",
+     "stats|summary|media SOURCE...",
+     "Show how values went over captures",
+     kTrend,
+     Subject::kTrend,
+     Task::kTrend,
+     {}},
+    {"identify",
+     "SOURCE...",
+     "Tell which kind of capture each is",
+     kIdentify,
+     Subject::kListing,
+     Task::kIdentify,
+     {}},
+    {"keys",
+     "stats|media [GLOB]",
+     "List the keys that have a name",
+     kKeys,
+     Subject::kListing,
+     Task::kKeys,
+     {}},
 };
 
 /// What the words of a command line come to before they are made into options of the program.
@@ -371,41 +400,29 @@ class CommandLine {
 
   void takeArguments() {
     Options& options = wanted_.options;
-    switch (wanted_.command->bit) {
-      case kStats:
-        options.decoding.kind = Kind::kStats;
-        return takeSources();
-      case kSummary:
-        options.decoding.kind = Kind::kSummary;
-        return takeSources();
-      case kMedia:
-        options.decoding.kind = Kind::kMedia;
-        return takeSources();
-      case kSnapshot:
-        options.decoding.kind = Kind::kSnapshot;
-        takeSources();
-        if (options.sources.size() != 1) throw UsageError("snapshot takes one source, but got " + listed());
-        return;
-      case kDiff:
-        options.task = Task::kDifference;
+    options.task = wanted_.command->task;
+    options.decoding.kind = wanted_.command->kind;
+    switch (options.task) {
+      case Task::kDifference:
         takeKind("OLD NEW", kMany);
         options.sources = arguments_;
         if (arguments_.size() != 2) {
           throw UsageError("diff takes two captures, OLD NEW, but got " + listed());
         }
         return;
-      case kTrend:
-        options.task = Task::kTrend;
+      case Task::kTrend:
         takeKind("SOURCE...", kMany);
         return takeSources();
-      case kIdentify:
-        options.task = Task::kIdentify;
-        return takeSources();
-      default:
-        options.task = Task::kKeys;
+      case Task::kKeys:
         takeKind("[GLOB]", kStats | kMedia);
         if (arguments_.size() > 1) throw UsageError("keys takes one pattern, but got " + listed());
         if (!arguments_.empty()) options.decoding.selection.addPattern(arguments_.front());
+        return;
+      default:
+        takeSources();
+        if (wanted_.command->bit == kSnapshot && arguments_.size() != 1) {
+          throw UsageError("snapshot takes one source, but got " + listed());
+        }
     }
   }
 
