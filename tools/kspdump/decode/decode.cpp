@@ -9,7 +9,6 @@
 namespace kspdump {
 
 void Collector::addNumbered(Record record, std::string_view prefix) {
-  makeRoom();
   char(&name)[Batch::kLongestNumbered] = batch_.names_[batch_.count_];
   std::memcpy(name, prefix.data(), prefix.size());
   const char* const end = std::to_chars(name + prefix.size(), std::end(name), record.key).ptr;

@@ -67,8 +67,8 @@ class Collector {
     ++capture_.recordCount;
     if (!selection_.isEmpty() && !selection_.selects(record.name, record.key, used_)) return;
     ++capture_.shownCount;
-    makeRoom();
     batch_.records_[batch_.count_++] = record;
+    if (batch_.count_ == Batch::kMost) handOn();
   }
 
   /// A record that is named by its key: `prefix`, of a few characters, and the number.
@@ -78,9 +78,6 @@ class Collector {
   void finish();
 
  private:
-  void makeRoom() {
-    if (batch_.count_ == Batch::kMost) handOn();
-  }
   void handOn();
 
   Capture& capture_;

@@ -12,10 +12,11 @@ constexpr uint32_t kMostPriorities = 64;
 
 std::optional<size_t> trackNamed(const Series& series, const std::string& name, bool isArray) {
   const std::vector<Track>& tracks = series.tracks();
-  for (size_t i = 0; i < tracks.size(); ++i) {
-    if (tracks[i].name == name && tracks[i].isArray == isArray) return i;
-  }
-  return std::nullopt;
+  const auto at = std::find_if(tracks.begin(), tracks.end(), [&](const Track& each) {
+    return each.name == name && each.isArray == isArray;
+  });
+  if (at == tracks.end()) return std::nullopt;
+  return static_cast<size_t>(at - tracks.begin());
 }
 
 std::optional<double> divided(const Wide& dividend, const Wide& divisor) {

@@ -53,8 +53,7 @@ std::string decimal(std::optional<Wide> number, bool withSign = false) {
 }
 
 std::string rounded(double number, int digits) {
-  char text[400];
-  return grouped({text, std::to_chars(text, std::end(text), number, std::chars_format::fixed, digits).ptr});
+  return grouped(fixed(number, digits));
 }
 
 /// With as many digits as its reader can use.

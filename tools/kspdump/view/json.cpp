@@ -84,13 +84,12 @@ class Json : public View {
   }
 
   void difference(const Series& series) override {
-    const Capture& before = series.captures().front();
-    const Capture& after = series.captures().back();
+    const std::span<const Capture> captures = series.captures();
     std::string& out = sink_.text;
     out += "{\"old\":";
-    appendJson(out, before.source);
+    appendJson(out, captures.front().source);
     out += ",\"new\":";
-    appendJson(out, after.source);
+    appendJson(out, captures.back().source);
     out.append(",\"kind\":\"").append(kindName(series.kind())).append("\",\"changes\":[");
     const char* separator = "";
     for (const size_t track : series.tracksInOrder()) {
@@ -102,9 +101,9 @@ class Json : public View {
       out += '}';
     }
     out += "],";
-    appendFindings(out, "old_findings", {&before, 1});
+    appendFindings(out, "old_findings", captures.first(1));
     out += ',';
-    appendFindings(out, "new_findings", {&after, 1});
+    appendFindings(out, "new_findings", captures.last(1));
     out += "}\n";
   }
 

@@ -11,6 +11,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <system_error>
+#include <utility>
 
 #include "tools/kspdump/view/text.h"
 #include "tools/kspdump/wait.h"
@@ -105,9 +106,7 @@ void Output::write(std::string_view text) {
 
 void Output::finish() {
   if (path_.empty()) return;
-  const int descriptor = descriptor_;
-  descriptor_ = -1;
-  if (close(descriptor) != 0) fail("cannot be written");
+  if (close(std::exchange(descriptor_, -1)) != 0) fail("cannot be written");
   if (unfinished_.empty()) return;
   if (rename(unfinished_.c_str(), target_.c_str()) != 0) fail("cannot be written");
   unfinished_.clear();

@@ -55,14 +55,17 @@ std::string drawBars(size_t count, const std::function<double(size_t)>& valueAt)
       if (std::abs(each) > std::abs(value)) value = each;
     }
     if (value == 0) continue;
-    std::string& path = value > 0 ? up : down;
+    const bool falls = value < 0;
+    std::string& path = falls ? down : up;
     // What is there at all is seen.
     const double height = std::max(std::abs(value) * kHeight / range, 1.0);
+    const double tip = falls ? base + height : base - height;
     const double left = static_cast<double>(bar) * step;
+    const double right = left + std::max(step - 1, 1.0);
     appendPoint(path, 'M', left, base);
-    appendPoint(path, 'L', left, value > 0 ? base - height : base + height);
-    appendPoint(path, 'L', left + std::max(step - 1, 1.0), value > 0 ? base - height : base + height);
-    appendPoint(path, 'L', left + std::max(step - 1, 1.0), base);
+    appendPoint(path, 'L', left, tip);
+    appendPoint(path, 'L', right, tip);
+    appendPoint(path, 'L', right, base);
   }
   std::string paths;
   if (!up.empty()) paths += "<path class=\"up\" d=\"" + up + "\"/>";
