@@ -119,6 +119,11 @@ class InOrder {
     void showBatch() {
       for (size_t i = 0; i < count_; ++i) {
         Input& input = inputs_[i];
+        // One buffer, still in the cache, serves all that are to be read.
+        if (input.state == Input::State::kNamed) {
+          std::swap(input.bytes, buffer_);
+          input.bytes.clear();
+        }
         std::unique_ptr<Source> within;
         try {
           within = load(input, all_.work_.reading);
@@ -135,11 +140,7 @@ class InOrder {
         }
         if (input.state == Input::State::kRead) all_.usualBytes_ = input.bytes.size();
         if (input.state != Input::State::kPassedOver) show_(input);
-        // One buffer, still in the cache, serves all that are to be read.
-        if (i + 1 < count_ && inputs_[i + 1].state == Input::State::kNamed) {
-          std::swap(input.bytes, inputs_[i + 1].bytes);
-          inputs_[i + 1].bytes.clear();
-        }
+        std::swap(input.bytes, buffer_);
       }
     }
 
@@ -164,6 +165,7 @@ class InOrder {
     At batch_;
     std::vector<Input> inputs_;
     size_t count_ = 0;
+    Buffer buffer_;
   };
 
   /// Puts the next batch into the list, as soon as there is one. Returns false when there will be none.
