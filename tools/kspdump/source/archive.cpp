@@ -7,7 +7,6 @@
 #include <cerrno>
 #include <climits>
 #include <cstdio>
-#include <cstring>
 #include <vector>
 
 #include "tools/kspdump/source/stream.h"
@@ -201,7 +200,7 @@ class Unpacked : public Stream {
   size_t read(unsigned char* out, size_t size) override {
     if (block_.empty() && !isEmpty_) block_ = reader_.readBlock();
     const size_t count = std::min(size, block_.size());
-    if (count != 0) std::memcpy(out, block_.data(), count);
+    std::copy_n(block_.begin(), count, out);
     block_ = block_.subspan(count);
     return count;
   }

@@ -79,13 +79,11 @@ class Folder : public Source {
 
   static std::string withSlash(const std::string& path) { return path.ends_with('/') ? path : path + '/'; }
 
+  /// Not every file system tells it in the entry itself.
   static Type typeOf(int folder, const dirent& entry) {
-    unsigned char type = entry.d_type;
     struct stat status = {};
-    if (type == DT_UNKNOWN && fstatat(folder, entry.d_name, &status, AT_SYMLINK_NOFOLLOW) == 0) {
-      type = static_cast<unsigned char>(IFTODT(status.st_mode));
-    }
-    return type == DT_REG ? Type::kFile : type == DT_DIR ? Type::kFolder : Type::kOther;
+    fstatat(folder, entry.d_name, &status, AT_SYMLINK_NOFOLLOW);
+    return S_ISREG(status.st_mode) ? Type::kFile : S_ISDIR(status.st_mode) ? Type::kFolder : Type::kOther;
   }
 
   /// Returns 0, or the error number of why the folder cannot be read.

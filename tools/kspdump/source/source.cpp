@@ -2,7 +2,6 @@
 #include "tools/kspdump/source/source.h"
 
 #include <algorithm>
-#include <cstring>
 
 #include "tools/kspdump/source/stream.h"
 
@@ -131,19 +130,19 @@ class NameList : public Source {
   /// Takes the next name. Returns false behind the last.
   bool take(std::string& name) {
     for (;;) {
-      const unsigned char* const first = chunk_.data() + at_;
-      const size_t left = chunk_.size() - at_;
-      const void* const end = left == 0 ? nullptr : std::memchr(first, '\0', left);
-      const size_t length =
-          end == nullptr ? left : static_cast<size_t>(static_cast<const unsigned char*>(end) - first);
-      name.append(reinterpret_cast<const char*>(first), length);
-      at_ += length + (end == nullptr ? 0 : 1);
-      if (end != nullptr) return true;
+      const unsigned char* const last = chunk_.data() + chunk_.size();
+      const unsigned char* const end = std::find(at_, last, '\0');
+      name.append(at_, end);
+      at_ = end;
+      if (end != last) {
+        ++at_;
+        return true;
+      }
       isOver_ = true;  // unless more can be read
       if (name.size() > kBlockBytes) throw ReadFault("it has no names that end with NULs");
       chunk_.clear();
-      at_ = 0;
       chunk_.added(file_->read(chunk_.room(kBlockBytes), kBlockBytes));
+      at_ = chunk_.data();
       if (chunk_.size() != 0) {
         isOver_ = false;
         continue;
@@ -158,7 +157,8 @@ class NameList : public Source {
   std::string list_;
   std::unique_ptr<File> file_;
   Buffer chunk_;
-  size_t at_ = 0;
+  /// What of it is still to be taken.
+  const unsigned char* at_ = nullptr;
   uint64_t count_ = 0;
   bool isOver_ = false;
 };
@@ -189,13 +189,10 @@ std::unique_ptr<Source> joined(std::vector<std::unique_ptr<Source>> sources) {
 }
 
 void Input::reset() {
-  state = State::kNamed;
-  name.clear();
-  path.clear();
-  bytes.clear();
-  fault.clear();
-  isFound = false;
-  depth = 0;
+  Buffer kept = std::move(bytes);
+  kept.clear();
+  *this = {};
+  bytes = std::move(kept);
 }
 
 bool Names::next(Input& input) {
