@@ -3,8 +3,11 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <optional>
 #include <string>
 #include <vector>
+
+#include "tools/kspdump/series/wide.h"
 
 namespace kspdump {
 
@@ -28,6 +31,10 @@ struct Ranking {
 struct Over {
   std::string name;
   std::vector<uint64_t> values;
+
+  /// A change from the first point to the last by what these values went over meanwhile; none where they went
+  /// over nothing.
+  [[nodiscard]] std::optional<double> perUnit(const std::optional<Wide>& change) const;
 };
 
 }  // namespace kspdump

@@ -137,25 +137,22 @@ std::optional<Wide> Series::sum(size_t track, size_t point) const {
   return kspdump::sum(at);
 }
 
+std::vector<std::optional<Wide>> Series::sums(size_t track) const {
+  std::vector<std::optional<Wide>> sums;
+  for (size_t point = 0; point < points(); ++point) sums.push_back(sum(track, point));
+  return sums;
+}
+
 std::optional<Wide> Series::delta(size_t track, uint32_t element) const {
-  const auto first = value(track, 0, element);
-  const auto last = value(track, points() - 1, element);
-  if (!first || !last) return std::nullopt;
-  return Wide(*last) - Wide(*first);
+  return changeOf(value(track, 0, element), value(track, points() - 1, element));
 }
 
 std::optional<Wide> Series::change(size_t track) const {
-  const auto first = sum(track, 0);
-  const auto last = sum(track, points() - 1);
-  if (!first || !last) return std::nullopt;
-  return *last - *first;
+  return changeOf(sum(track, 0), sum(track, points() - 1));
 }
 
 std::optional<double> Series::percent(size_t track) const {
-  constexpr double kWhole = 100;
-  const auto grown = change(track);
-  if (!grown || *sum(track, 0) == Wide()) return std::nullopt;
-  return static_cast<double>(*grown) / static_cast<double>(*sum(track, 0)) * kWhole;
+  return percentOf(sum(track, 0), sum(track, points() - 1));
 }
 
 bool Series::changes(size_t track) const {
@@ -168,6 +165,12 @@ bool Series::changes(size_t track) const {
     }
   }
   return false;
+}
+
+std::optional<double> Over::perUnit(const std::optional<Wide>& change) const {
+  const uint64_t units = values.back() - values.front();
+  if (!change || units == 0) return std::nullopt;
+  return static_cast<double>(*change) / static_cast<double>(units);
 }
 
 Wide sum(const Values& values) {

@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "tools/kspdump/decode/capture.h"
+#include "tools/kspdump/series/course.h"
 #include "tools/kspdump/series/ranking.h"
 #include "tools/kspdump/series/wide.h"
 
@@ -67,6 +68,8 @@ class Series {
   [[nodiscard]] std::optional<uint64_t> value(size_t track, size_t point, uint32_t element) const;
   /// Of all elements; none where the track has no value there.
   [[nodiscard]] std::optional<Wide> sum(size_t track, size_t point) const;
+  /// That at each point.
+  [[nodiscard]] std::vector<std::optional<Wide>> sums(size_t track) const;
   /// What an element grew by from the first point to the last; none where it is missing at one.
   [[nodiscard]] std::optional<Wide> delta(size_t track, uint32_t element) const;
   /// What the sum grew by from the first point to the last; none where it is missing at one.

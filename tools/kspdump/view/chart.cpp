@@ -46,9 +46,7 @@ class Chart : public View {
     std::vector<Line> lines;
     Grid grid(columns());
     for (const size_t track : series.tracksInOrder()) {
-      const Track& about = series.tracks()[track];
-      addLine(grid, lines, about.name, series.points(),
-              [&](size_t point) { return series.sum(track, point); });
+      addLine(grid, lines, series.tracks()[track].name, series.sums(track));
     }
     addLines(grid, lines);
     appendFindings(out, series);
@@ -65,6 +63,9 @@ class Chart : public View {
     return {{"NAME", false}, {"LEAST", true}, {"MEAN", true}, {"GREATEST", true}};
   }
 
+  static std::string text(std::optional<double> number) { return number ? fixed(*number, kDecimals) : "-"; }
+  static std::string text(std::optional<Wide> number) { return number ? number->text() : "-"; }
+
   /// The fields of each interval, and what is derived from them.
   void addIntervals() {
     const Series& series = intervals_;
@@ -73,49 +74,37 @@ class Chart : public View {
     for (size_t track = 0; track < series.tracks().size(); ++track) {
       const Track& about = series.tracks()[track];
       for (uint32_t i = 0; i < about.elements; ++i) {
-        addLine(grid, lines, about.isArray ? about.name + "_" + std::to_string(i) : about.name,
-                series.points(),
-                [&](size_t point) -> std::optional<Wide> { return series.value(track, point, i); });
+        std::vector<std::optional<Wide>> values;
+        for (size_t point = 0; point < series.points(); ++point) {
+          values.emplace_back(series.value(track, point, i));
+        }
+        addLine(grid, lines, about.isArray ? about.name + "_" + std::to_string(i) : about.name, values);
       }
     }
     for (const Ratio& ratio : ratiosOf(series)) {
       Line line;
-      std::optional<double> least;
-      std::optional<double> greatest;
+      Extremes<double> extremes;
       for (size_t point = 0; point < series.points(); ++point) {
         const auto value = ratioAt(series, ratio, point);
         line.push_back(value);
-        if (!value) continue;
-        least = std::min(least.value_or(*value), *value);
-        greatest = std::max(greatest.value_or(*value), *value);
+        if (value) extremes.take(*value);
       }
-      const auto text = [](std::optional<double> number) { return number ? fixed(*number, kDecimals) : "-"; };
-      grid.add({printable(ratio.name), text(least), text(ratioOverall(series, ratio)), text(greatest)});
+      grid.add({printable(ratio.name), text(extremes.least), text(ratioOverall(series, ratio)),
+                text(extremes.greatest)});
       lines.push_back(thinned(line));
     }
     addLines(grid, lines);
   }
 
-  template <class ValueAt>
-  void addLine(Grid& grid, std::vector<Line>& lines, const std::string& name, size_t points,
-               ValueAt valueAt) {
+  void addLine(Grid& grid, std::vector<Line>& lines, const std::string& name,
+               const std::vector<std::optional<Wide>>& values) {
+    const Course course(values);
+    grid.add(
+        {printable(name), text(course.extremes.least), text(course.mean), text(course.extremes.greatest)});
     Line line;
-    Wide total;
-    std::optional<Wide> least;
-    std::optional<Wide> greatest;
-    size_t count = 0;
-    for (size_t point = 0; point < points; ++point) {
-      const std::optional<Wide> value = valueAt(point);
+    for (const auto& value : values) {
       line.push_back(value ? std::optional(static_cast<double>(*value)) : std::nullopt);
-      if (!value) continue;
-      ++count;
-      total += *value;
-      least = std::min(least.value_or(*value), *value);
-      greatest = std::max(greatest.value_or(*value), *value);
     }
-    grid.add({printable(name), least ? least->text() : "-",
-              count != 0 ? fixed(static_cast<double>(total) / static_cast<double>(count), kDecimals) : "-",
-              greatest ? greatest->text() : "-"});
     lines.push_back(thinned(line));
   }
 

@@ -63,11 +63,9 @@ std::string shortest(double number) {
   return {text, std::to_chars(text, std::end(text), number, std::chars_format::general, kDigits).ptr};
 }
 
-/// What a value grew by, of a hundred of what it was.
-std::string percent(std::optional<Wide> before, std::optional<Wide> after) {
-  if (!before || !after || *before == Wide()) return "";
-  const double change = 100 * static_cast<double>(*after - *before) / static_cast<double>(*before);
-  return (change > 0 ? "+" : "") + rounded(change, 1);
+std::string percent(std::optional<double> number) {
+  if (!number) return "";
+  return (*number > 0 ? "+" : "") + rounded(*number, 1);
 }
 
 /// Appends a JSON text in which nothing is markup.
@@ -367,29 +365,29 @@ class Html : public View {
   /// A row that is worked out from two of a snapshot's fields.
   void row(const Ratio& ratio) {
     constexpr int kDecimals = 2;
-    drawn_.clear();
-    double least = std::numeric_limits<double>::infinity();
-    double greatest = -least;
+    std::vector<std::optional<double>> values;
+    Extremes<double> extremes;
     for (size_t point = 0; point < series_.points(); ++point) {
       const auto value = ratioAt(series_, ratio, point);
-      drawn_.push_back(value.value_or(kMissing));
-      least = std::min(least, value.value_or(least));
-      greatest = std::max(greatest, value.value_or(greatest));
+      values.push_back(value);
+      if (value) extremes.take(*value);
     }
     const auto overall = ratioOverall(series_, ratio);
     if (!overall) return;
     std::vector<std::string> numbers;
-    for (const double number : {drawn_.front(), drawn_.back(), least, *overall, greatest}) {
-      numbers.push_back(std::isnan(number) ? "" : rounded(number, kDecimals));
+    for (const auto& number : {values.front(), values.back(), extremes.least, overall, extremes.greatest}) {
+      numbers.push_back(number ? rounded(*number, kDecimals) : "");
     }
+    drawn_.clear();
+    for (const auto& value : values) drawn_.push_back(value.value_or(kMissing));
     beginRow(true, "", ratio.name, numbers, "", drawLine(drawn_));
     std::string& json = sink_.text;
     json += "{\"key\":null,\"name\":";
     appendSafeJson(json, ratio.name);
     json += ",\"values\":[";
-    for (const double& value : drawn_) {
-      if (&value != &drawn_.front()) json += ',';
-      json += std::isnan(value) ? "null" : shortest(value);
+    for (const auto& value : values) {
+      if (&value != &values.front()) json += ',';
+      json += value ? shortest(*value) : "null";
       sink_.offer();
     }
     json += "]}";
@@ -435,46 +433,30 @@ class Html : public View {
     for (const Values& values : points_) {
       totals_.push_back(values.empty() ? std::nullopt : std::optional(sum(values)));
     }
-    const auto& first = totals_.front();
-    const auto& last = totals_.back();
-    std::optional<Wide> change;
-    if (first && last) change = *last - *first;
-    if (about == About::kCapture) return {decimal(first)};
-    if (about == About::kDifference) {
-      return {decimal(first), decimal(last), decimal(change, true), percent(first, last)};
-    }
-    std::optional<Wide> least;
-    std::optional<Wide> greatest;
-    Wide all;
-    unsigned present = 0;
-    for (const auto& total : totals_) {
-      if (!total) continue;
-      least = std::min(least.value_or(*total), *total);
-      greatest = std::max(greatest.value_or(*total), *total);
-      all += *total;
-      ++present;
-    }
-    if (about == About::kTrend) {
-      std::vector<std::string> numbers = {decimal(first),    decimal(last),         decimal(least),
-                                          decimal(greatest), decimal(change, true), percent(first, last)};
-      if (over_ != nullptr) numbers.push_back(perUnit(change));
-      return numbers;
-    }
-    const double mean = static_cast<double>(all) / std::max(present, 1U);
-    return {decimal(first), decimal(last), decimal(least),
-            rounded(mean, mean < 10     ? 2
-                          : mean < 1000 ? 1
-                                        : 0),
-            decimal(greatest)};
+    const Course course(totals_);
+    if (about == About::kCapture) return {decimal(course.first)};
+    std::vector<std::string> numbers = {decimal(course.first), decimal(course.last)};
+    const auto add = [&](std::string number) { numbers.push_back(std::move(number)); };
+    if (about != About::kDifference) add(decimal(course.extremes.least));
+    if (about == About::kSnapshot) add(mean(course.mean));
+    if (about != About::kDifference) add(decimal(course.extremes.greatest));
+    if (about == About::kSnapshot) return numbers;
+    add(decimal(course.change, true));
+    add(percent(course.percent));
+    if (over_ != nullptr) add(perUnit(over_->perUnit(course.change)));
+    return numbers;
+  }
+
+  static std::string mean(std::optional<double> number) {
+    if (!number) return "";
+    return rounded(*number, *number < 10 ? 2 : *number < 1000 ? 1 : 0);
   }
 
   /// A change by what the captures went over meanwhile.
-  [[nodiscard]] std::string perUnit(const std::optional<Wide>& change) const {
+  static std::string perUnit(std::optional<double> each) {
     constexpr double kLarge = 100;
-    const double units = static_cast<double>(Wide(over_->values.back()) - Wide(over_->values.front()));
-    if (!change || units == 0) return "";
-    const double each = static_cast<double>(*change) / units;
-    return rounded(each, std::abs(each) < kLarge ? 3 : 0);
+    if (!each) return "";
+    return rounded(*each, std::abs(*each) < kLarge ? 3 : 0);
   }
 
   std::string pictureOf(About about, bool isArray, uint32_t elements) {

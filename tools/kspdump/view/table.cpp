@@ -223,9 +223,7 @@ void Table::trend(const Series& series) {
   std::vector<Grid::Column> columns = {{"KEY", true},   {"NAME", false},    {"FIRST", true},  {"LAST", true},
                                        {"LEAST", true}, {"GREATEST", true}, {"CHANGE", true}, {"%", true}};
   const Over* const over = series.over();
-  uint64_t span = 0;
   if (over != nullptr) {
-    span = over->values.back() - over->values.front();
     out += ", over " + printable(over->name) + " " + std::to_string(over->values.front()) + " to " +
            std::to_string(over->values.back());
     columns.push_back({"PER UNIT", true});
@@ -233,33 +231,24 @@ void Table::trend(const Series& series) {
   out += '\n';
   Grid grid(columns);
   for (const size_t track : tracks) {
-    std::optional<Wide> least;
-    std::optional<Wide> greatest;
-    for (size_t point = 0; point < series.points(); ++point) {
-      const auto value = series.sum(track, point);
-      if (!value) continue;
-      least = std::min(least.value_or(*value), *value);
-      greatest = std::max(greatest.value_or(*value), *value);
-    }
-    const auto change = series.change(track);
+    const Course course(series.sums(track));
     std::vector<std::string> row = {std::to_string(series.tracks()[track].key),
                                     printable(series.tracks()[track].name),
-                                    decimal(series.sum(track, 0)),
-                                    decimal(series.sum(track, series.points() - 1)),
-                                    decimal(least),
-                                    decimal(greatest),
-                                    decimal(change, true),
-                                    percent(series.percent(track))};
+                                    decimal(course.first),
+                                    decimal(course.last),
+                                    decimal(course.extremes.least),
+                                    decimal(course.extremes.greatest),
+                                    decimal(course.change, true),
+                                    percent(course.percent)};
     if (over != nullptr) {
-      row.push_back(change && span != 0 ? fixed(static_cast<double>(*change) / static_cast<double>(span), 3)
-                                        : "-");
+      const auto each = over->perUnit(course.change);
+      row.push_back(each ? fixed(*each, 3) : "-");
     }
     grid.add(std::move(row));
   }
   addRows(grid, "TREND", [&](size_t row, size_t width) {
     std::vector<std::optional<double>> values;
-    for (size_t point = 0; point < series.points(); ++point) {
-      const auto value = series.sum(tracks[row], point);
+    for (const auto& value : series.sums(tracks[row])) {
       values.push_back(value ? std::optional(static_cast<double>(*value)) : std::nullopt);
     }
     appendSparkline(sink_.text, values, width);
