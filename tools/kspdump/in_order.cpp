@@ -284,8 +284,6 @@ class InOrder {
     } else {
       std::swap(batch->text, lane.sink.text);
       std::swap(batch->actions, lane.actions_);
-      lane.sink.text.clear();
-      lane.actions_.clear();
     }
     batch->isDone = true;
     // Whoever takes the first one from the list writes what waits behind it.
