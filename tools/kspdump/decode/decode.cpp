@@ -1,20 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "tools/kspdump/decode/decode.h"
 
-#include <charconv>
-#include <cstring>
-
 #include "tools/kspdump/decode/recognise.h"
 
 namespace kspdump {
-
-void Collector::addNumbered(Record record, std::string_view prefix) {
-  char(&name)[Batch::kLongestNumbered] = batch_.names_[batch_.count_];
-  std::memcpy(name, prefix.data(), prefix.size());
-  const char* const end = std::to_chars(name + prefix.size(), std::end(name), record.key).ptr;
-  record.name = {name, static_cast<size_t>(end - name)};
-  add(record);
-}
 
 void Collector::handOn() {
   take_(batch_.records());

@@ -7,6 +7,7 @@
 #include <string>
 #include <vector>
 
+#include "ksp/detail/key_name.hpp"
 #include "tools/kspdump/decode/capture.h"
 #include "tools/kspdump/decode/selection.h"
 
@@ -38,11 +39,10 @@ class Batch {
   friend class Collector;
 
   static constexpr size_t kMost = 1024;
-  static constexpr size_t kLongestNumbered = 24;
 
   size_t count_ = 0;
   std::array<Record, kMost> records_;
-  std::array<char[kLongestNumbered], kMost> names_;
+  std::array<ksp::KeyName, kMost> names_;
 };
 
 /// Decodes `capture.bytes` as far as they go, hands the selected records to `take`, a batch at a time, and
@@ -71,8 +71,13 @@ class Collector {
     if (batch_.count_ == Batch::kMost) handOn();
   }
 
-  /// A record that is named by its key: `prefix`, of a few characters, and the number.
-  void addNumbered(Record record, std::string_view prefix);
+  /// A record that is named by its key: `stem` and the number behind it.
+  void addNumbered(Record record, std::string_view stem) {
+    ksp::KeyName& name = batch_.names_[batch_.count_];
+    name.assign(stem, record.key);
+    record.name = name;
+    add(record);
+  }
 
   /// Hands on the last records, and names what selected none.
   void finish();
