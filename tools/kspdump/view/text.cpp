@@ -18,8 +18,8 @@ void appendSpelledOut(std::string& out, std::string_view bytes) {
   }
 }
 
-/// Takes the next UTF-8 character from `text`; `character` is then its number. Returns its bytes, or one byte
-/// that is none, with a number above all characters.
+/// Takes the next UTF-8 character from `text`; `character` is then its number. Returns its bytes, or some
+/// that are none, with a number above all characters.
 std::string_view takeCharacter(std::string_view& text, uint32_t& character) {
   constexpr uint32_t kNone = 0xFFFFFFFF;
   // The least number that may be written with so many bytes, and the bits of the first one that mark it.
@@ -39,7 +39,7 @@ std::string_view takeCharacter(std::string_view& text, uint32_t& character) {
     isSound = (static_cast<uint8_t>(text[i]) & 0xC0) == 0x80;
     number = number << 6 | (static_cast<uint8_t>(text[i]) & 0x3F);
   }
-  isSound = isSound && number >= form->least && number <= 0x10FFFF && (number < 0xD800 || number >= 0xE000);
+  isSound = isSound && number >= form->least && (number < 0xD800 || number >= 0xE000);
   character = isSound ? number : kNone;
   const std::string_view taken = text.substr(0, isSound ? length : 1);
   text.remove_prefix(taken.size());
