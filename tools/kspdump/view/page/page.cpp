@@ -3,6 +3,7 @@
 
 #include <algorithm>
 #include <stdexcept>
+#include <unordered_map>
 
 #include "tools/kspdump/view/text.h"
 
@@ -13,14 +14,20 @@ namespace {
 constexpr std::string_view kOpening = "{{";
 constexpr std::string_view kClosing = "}}";
 
-/// The text of a part.
-std::string_view partOf(std::string_view page, std::string_view part) {
+/// Parts of the page by their names.
+using Parts = std::unordered_map<std::string_view, std::string_view>;
+
+Parts partsOf(std::string_view page) {
   constexpr std::string_view kMark = "<!-- part ";
-  const std::string line = std::string(kMark).append(part).append(" -->\n");
-  const size_t at = page.find(line);
-  if (at == page.npos) throw std::logic_error("page.html has no part " + std::string(part));
-  page.remove_prefix(at + line.size());
-  return page.substr(0, page.find(kMark));
+  constexpr std::string_view kMarkEnd = " -->\n";
+  Parts parts;
+  for (size_t at = page.find(kMark); at != page.npos; at = page.find(kMark)) {
+    page.remove_prefix(at + kMark.size());
+    const std::string_view name = page.substr(0, page.find(kMarkEnd));
+    page.remove_prefix(name.size() + kMarkEnd.size());
+    parts[name] = page.substr(0, page.find(kMark));
+  }
+  return parts;
 }
 
 }  // namespace
@@ -50,7 +57,10 @@ void appendHtml(std::string& out, std::string_view text) {
 }
 
 void appendPart(std::string& out, std::string_view part, std::initializer_list<Field> fields) {
-  std::string_view rest = partOf(kPageHtml.text, part);
+  static const Parts kParts = partsOf(kPageHtml.text);
+  const auto found = kParts.find(part);
+  if (found == kParts.end()) throw std::logic_error("page.html has no part " + std::string(part));
+  std::string_view rest = found->second;
   for (size_t at = rest.find(kOpening); at != rest.npos; at = rest.find(kOpening)) {
     out += rest.substr(0, at);
     rest.remove_prefix(at + kOpening.size());
