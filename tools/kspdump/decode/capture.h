@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #pragma once
 
+#include <algorithm>
 #include <cstddef>
 #include <cstdint>
 #include <deque>
@@ -52,15 +53,14 @@ class Values {
     }
   }
 
-  [[nodiscard]] uint8_t width() const { return width_; }
-
-  /// Appends the values one behind the other, each in `width` bytes.
-  void copyTo(std::vector<unsigned char>& bytes) const {
-    for (uint32_t i = 0; i < count_; ++i) {
-      const unsigned char* const at = address(i);
-      bytes.insert(bytes.end(), at, at + width_);
-    }
+  /// Copies the values to `bytes`, one behind the other. Returns them there, and leaves `bytes` behind them.
+  Values copiedTo(unsigned char*& bytes) const {
+    const unsigned char* const first = bytes;
+    for (uint32_t i = 0; i < count_; ++i) bytes = std::copy_n(address(i), width_, bytes);
+    return {first, count_, width_, width_};
   }
+  /// How many these are.
+  [[nodiscard]] size_t copiedSize() const { return size_t{count_} * width_; }
 
   /// One of the values alone.
   [[nodiscard]] Values only(uint32_t i) const { return {address(i), 1, width_, stride_}; }

@@ -15,7 +15,7 @@ void Series::begin(const Capture& capture) {
   captures_.push_back(capture);
   copies_.emplace_back();
   cells_.emplace_back();
-  seen_.clear();
+  for (auto& [key, repeats] : repeats_) repeats.seen = 0;
 }
 
 void Series::records(std::span<const Record> records) {
@@ -27,11 +27,9 @@ void Series::records(std::span<const Record> records) {
     const size_t track = trackOf(record);
     tracks_[track].isArray |= record.isArray;
     tracks_[track].elements = std::max(tracks_[track].elements, record.values.size());
-    std::vector<Cell>& cells = cells_.back();
+    std::vector<Values>& cells = cells_.back();
     if (cells.size() <= track) cells.resize(tracks_.size());
-    std::vector<unsigned char>& copy = copies_.back();
-    cells[track] = {copy.size(), record.values.size(), record.values.width()};
-    record.values.copyTo(copy);
+    cells[track] = record.values;
   }
 }
 
@@ -39,7 +37,12 @@ void Series::end(const Capture& capture) {
   captures_.back() = capture;
   if (isSnapshot_) return putInTime(capture);
   captures_.back().bytes = {};
-  copies_.back().shrink_to_fit();
+  // What is shown of the capture stays when its bytes go.
+  size_t size = 0;
+  for (const Values& values : cells_.back()) size += values.copiedSize();
+  copies_.back() = std::make_unique_for_overwrite<unsigned char[]>(size);
+  unsigned char* at = copies_.back().get();
+  for (Values& values : cells_.back()) values = values.copiedTo(at);
 }
 
 void Series::putInTime(const Capture& capture) {
@@ -88,9 +91,12 @@ void Series::addInterval(const Record& record) {
 }
 
 size_t Series::trackOf(const Record& record) {
-  const auto [at, isNew] = trackOfKey_.try_emplace({record.key, seen_[record.key]++}, tracks_.size());
-  if (isNew) tracks_.push_back({record.key, std::string(record.name), false, 0});
-  return at->second;
+  Repeats& repeats = repeats_[record.key];
+  if (repeats.seen == repeats.tracks.size()) {
+    repeats.tracks.push_back(tracks_.size());
+    tracks_.push_back({record.key, std::string(record.name), false, 0});
+  }
+  return repeats.tracks[repeats.seen++];
 }
 
 std::vector<size_t> Series::tracksInOrder() const {
@@ -120,9 +126,7 @@ Values Series::values(size_t track, size_t point) const {
     return fields_[track].movedBy(static_cast<std::ptrdiff_t>(intervals_[point].offset) -
                                   static_cast<std::ptrdiff_t>(fieldsOffset_));
   }
-  if (track >= cells_[point].size()) return {};
-  const Cell& cell = cells_[point][track];
-  return {copies_[point].data() + cell.first, cell.count, cell.width, cell.width};
+  return track < cells_[point].size() ? cells_[point][track] : Values();
 }
 
 std::optional<uint64_t> Series::value(size_t track, size_t point, uint32_t element) const {

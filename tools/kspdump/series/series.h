@@ -2,11 +2,11 @@
 #pragma once
 
 #include <cstdint>
-#include <map>
+#include <memory>
 #include <optional>
 #include <span>
 #include <string>
-#include <utility>
+#include <unordered_map>
 #include <vector>
 
 #include "tools/kspdump/decode/capture.h"
@@ -80,11 +80,10 @@ class Series {
   [[nodiscard]] bool changes(size_t track) const;
 
  private:
-  /// Where a capture's values lie in the copy.
-  struct Cell {
-    size_t first = 0;
-    uint32_t count = 0;
-    uint8_t width = 0;
+  /// The tracks that a key has, one for each time that it came in one capture, and how often it came in this.
+  struct Repeats {
+    std::vector<size_t> tracks;
+    size_t seen = 0;
   };
   struct Interval {
     uint64_t offset;
@@ -102,11 +101,10 @@ class Series {
   std::vector<Capture> captures_;
   std::vector<Track> tracks_;
 
-  // Of captures, a copy of values each and a row of cells each.
-  std::vector<std::vector<unsigned char>> copies_;
-  std::vector<std::vector<Cell>> cells_;
-  std::map<std::pair<uint32_t, size_t>, size_t> trackOfKey_;
-  std::map<uint32_t, size_t> seen_;
+  // Of captures, the values of each by track, and the copies of the bytes in which they lie.
+  std::vector<std::vector<Values>> cells_;
+  std::vector<std::unique_ptr<unsigned char[]>> copies_;
+  std::unordered_map<uint32_t, Repeats> repeats_;
 
   // Of a snapshot, the fields of the first interval that was handed over; the others' lie at the same
   // distance.
