@@ -102,7 +102,7 @@ size_t Series::trackOf(const Record& record) {
 std::vector<size_t> Series::tracksInOrder() const {
   std::vector<size_t> order;
   for (size_t track = 0; track < tracks_.size(); ++track) {
-    if (isSnapshot_ || ranking_.withUnchanged || points() == 1 || changes(track)) order.push_back(track);
+    if (isSnapshot_ || ranking_.withUnchanged || changes(track)) order.push_back(track);
   }
   const auto sortBy = [&](auto isBefore) { std::stable_sort(order.begin(), order.end(), isBefore); };
   sortBy([&](size_t a, size_t b) { return tracks_[a].key < tracks_[b].key; });

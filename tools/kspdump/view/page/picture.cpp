@@ -84,7 +84,7 @@ std::string drawLine(const std::vector<double>& values) {
   }
   std::string path;
   bool isDrawing = false;
-  const double span = values.size() > 1 ? static_cast<double>(values.size() - 1) : 1;
+  const double span = std::max(static_cast<double>(values.size()) - 1, 1.0);
   const auto add = [&](size_t at) {
     if (std::isnan(values[at])) {
       isDrawing = false;
