@@ -178,7 +178,10 @@ class InOrder {
       if (findSource(from)) break;
       changed_.wait(lock);
     }
-    batch = nodes_.emplace(from);
+    if (written_.empty()) written_.emplace_back();
+    batch = written_.begin();
+    nodes_.splice(from, written_, batch);
+    batch->isDone = false;
     batch->tally = from->tally;
     from->isBusy = true;
     noteFirst();
@@ -297,7 +300,11 @@ class InOrder {
         work_.found({front->tally->name, front->tally->captures, front->tally->passedOver});
       }
       lock.lock();
-      nodes_.pop_front();
+      if (front->source == nullptr) {
+        written_.splice(written_.begin(), nodes_, front);
+      } else {
+        nodes_.erase(front);
+      }
       noteFirst();
       changed_.notify_all();
     }
@@ -333,6 +340,8 @@ class InOrder {
   std::mutex mutex_;
   std::condition_variable changed_;
   std::list<Node> nodes_;
+  /// Batches that are over, kept for the room that their texts have.
+  std::list<Node> written_;
   std::atomic<const Node*> first_ = nullptr;
   /// Files that are still to be read are taken to be like the last that was.
   std::atomic<uint64_t> usualBytes_ = kBatchBytes;
