@@ -29,7 +29,7 @@ class Values {
   Values() = default;
   /// `count` numbers of `width` bytes, 8 at most, each `stride` bytes behind the one before; negative strides
   /// go backwards.
-  Values(const unsigned char* first, uint32_t count, uint8_t width, int32_t stride)
+  Values(const unsigned char* first, uint32_t count, uint8_t width, int16_t stride)
       : first_(first), count_(count), stride_(stride), width_(width) {}
 
   [[nodiscard]] uint32_t size() const { return count_; }
@@ -77,7 +77,7 @@ class Values {
 
   const unsigned char* first_ = nullptr;
   uint32_t count_ = 0;
-  int32_t stride_ = 0;
+  int16_t stride_ = 0;
   uint8_t width_ = 0;
 };
 

@@ -32,7 +32,7 @@ struct Field {
   bool isArray;
   uint32_t offset;
   uint32_t count;
-  int32_t stride;
+  int16_t stride;
 };
 
 bool isShown(const ksp::SnapshotHeader& header, const ksp::FieldDescriptor& field) {
@@ -103,7 +103,7 @@ class Layout {
       // One without a label continues the field before it, as in "BF= 3/ 9".
       Field& last = fields_.back();
       last.isArray = true;
-      last.stride = static_cast<int32_t>(ksp::kWordBytes * field.word) - static_cast<int32_t>(last.offset);
+      last.stride = static_cast<int16_t>(ksp::kWordBytes * field.word - last.offset);
       ++last.count;
     }
   }

@@ -43,6 +43,7 @@ void Series::end(const Capture& capture) {
   copies_.back() = std::make_unique_for_overwrite<unsigned char[]>(size);
   unsigned char* at = copies_.back().get();
   for (Values& values : cells_.back()) values = values.copiedTo(at);
+  cells_.back().shrink_to_fit();
 }
 
 void Series::putInTime(const Capture& capture) {
