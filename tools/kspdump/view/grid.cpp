@@ -52,9 +52,12 @@ Grid::Grid(std::vector<Column> columns) : columns_(std::move(columns)) {
   for (const Column& column : columns_) widths_.push_back(columnsOf(column.head));
 }
 
-void Grid::add(std::vector<std::string> row) {
-  for (size_t i = 0; i < row.size(); ++i) widths_[i] = std::max(widths_[i], columnsOf(row[i]));
-  rows_.push_back(std::move(row));
+void Grid::add(const std::vector<std::string>& row) {
+  for (size_t i = 0; i < row.size(); ++i) {
+    widths_[i] = std::max(widths_[i], columnsOf(row[i]));
+    texts_ += row[i];
+    ends_.push_back(texts_.size());
+  }
 }
 
 void Grid::fit(size_t name, size_t least, size_t width, size_t reserve) {
@@ -70,20 +73,22 @@ size_t Grid::width() const {
 }
 
 void Grid::appendHead(std::string& out) const {
-  std::vector<std::string> heads;
-  for (const Column& column : columns_) heads.push_back(column.head);
-  append(out, heads);
+  for (size_t i = 0; i < columns_.size(); ++i) append(out, i, columns_[i].head);
 }
 
 void Grid::appendRow(std::string& out, size_t row) const {
-  append(out, rows_[row]);
+  const size_t first = row * columns_.size();
+  size_t begin = first == 0 ? 0 : ends_[first - 1];
+  for (size_t i = 0; i < columns_.size(); ++i) {
+    const size_t end = ends_[first + i];
+    append(out, i, std::string_view(texts_).substr(begin, end - begin));
+    begin = end;
+  }
 }
 
-void Grid::append(std::string& out, const std::vector<std::string>& row) const {
-  for (size_t i = 0; i < row.size(); ++i) {
-    if (i != 0) out.append(kGap, ' ');
-    appendPadded(out, cutTo(row[i], widths_[i]), widths_[i], columns_[i].right);
-  }
+void Grid::append(std::string& out, size_t column, std::string_view text) const {
+  if (column != 0) out.append(kGap, ' ');
+  appendPadded(out, cutTo(text, widths_[column]), widths_[column], columns_[column].right);
 }
 
 }  // namespace kspdump

@@ -32,13 +32,14 @@ class Grid {
 
   explicit Grid(std::vector<Column> columns);
 
-  void add(std::vector<std::string> row);
+  /// A text for each column.
+  void add(const std::vector<std::string>& row);
 
   /// Makes column `name` narrower, `least` columns at least, where that fits lines of `width` columns with
   /// `reserve` behind them.
   void fit(size_t name, size_t least, size_t width, size_t reserve);
 
-  [[nodiscard]] size_t rows() const { return rows_.size(); }
+  [[nodiscard]] size_t rows() const { return ends_.size() / columns_.size(); }
   /// Columns that a line takes.
   [[nodiscard]] size_t width() const;
 
@@ -46,11 +47,14 @@ class Grid {
   void appendRow(std::string& out, size_t row) const;
 
  private:
-  void append(std::string& out, const std::vector<std::string>& row) const;
+  /// Appends a column's text to a line.
+  void append(std::string& out, size_t column, std::string_view text) const;
 
   std::vector<Column> columns_;
   std::vector<size_t> widths_;
-  std::vector<std::vector<std::string>> rows_;
+  /// The rows' texts, one behind the other, and where each ends.
+  std::string texts_;
+  std::vector<size_t> ends_;
 };
 
 }  // namespace kspdump

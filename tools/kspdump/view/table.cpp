@@ -244,7 +244,7 @@ void Table::trend(const Series& series) {
       const auto each = over->perUnit(course.change);
       row.push_back(each ? fixed(*each, 3) : "-");
     }
-    grid.add(std::move(row));
+    grid.add(row);
   }
   addRows(grid, "TREND", [&](size_t row, size_t width) {
     std::vector<std::optional<double>> values;
@@ -294,7 +294,7 @@ void Table::listing(const Listing& listing) {
       cells.push_back(number != nullptr ? std::to_string(*number) + listing.columns[i].unit
                                         : printable(std::get<std::string>(row[i])));
     }
-    grid.add(std::move(cells));
+    grid.add(cells);
   }
   grid.appendHead(sink_.text);
   sink_.text += '\n';
